@@ -29,7 +29,8 @@ class SubmissionService {
 
   virtual ~SubmissionService() = default;
 
-  /// Whether the user allows diagnostic submission.
+  /// Whether the user allows diagnostic submission. Begins a report: ask once, before reading the
+  /// statistics that its log will hold. After a withdrawal this deletes the logs that wait.
   virtual bool isDiagnosticSubmissionEnabled() = 0;
 
   /// False when it cannot be known whether the user allows submission; it then counts as forbidden.

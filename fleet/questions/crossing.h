@@ -1,8 +1,9 @@
-// Two divisions of the same logs, and whether they can be subtracted to derive few devices.
+// Two divisions of the same logs, and whether a reader who has seen both can work out figures of
+// few devices.
 //
-// Everything that sums of groups of one division, less sums of groups of the other, say about a set
-// of logs amounts to this: some groups of one, less groups of the other that these cover. What
-// remains is made of intersections of a group of one with a group of the other.
+// All that such a reader can do is to add up groups of one division and subtract groups of the
+// other that lie within that sum. What remains consists of intersections of a group of one with a
+// group of the other.
 #pragma once
 
 #include <cstddef>
@@ -23,9 +24,9 @@ class Crossing {
   Crossing(const LogTable& table, const std::vector<const LogSet*>& groups, const Sets& earlier,
            std::size_t devicesAtLeast);
 
-  /// Empty when fewer devices than `devicesAtLeast` cannot be derived, given that the joined groups
-  /// count as one. Otherwise groups that should join them, the first of `order` that may help;
-  /// nothing small can be derived at the latest when all are joined.
+  /// Empty when nothing of fewer than `devicesAtLeast` devices can be derived while the joined
+  /// groups count as one. Otherwise groups to join with them, the first in `order` that may help;
+  /// then ask again. When all are joined, nothing small can be derived.
   std::vector<std::size_t> groupsToJoin(const std::vector<bool>& isJoined,
                                         std::span<const std::size_t> order) const;
 

@@ -29,10 +29,9 @@ struct Division {
 
 /// Divides the union of the groups, which share no log, into parts that may be shown, and notes the
 /// parts and the whole as shown. Joins groups of too few devices, and as many of the smallest
-/// others as it takes for what remains of the whole without the shown groups to have enough
-/// devices, too, and for sums of groups, less groups of an earlier division of the same whole that
-/// they include, to leave nothing or enough devices. Drops empty groups; a whole that cannot be
-/// divided has no groups.
+/// others as it takes until neither the rest of the whole nor a difference from an earlier division
+/// (crossing.h) comes from few devices. Drops empty groups; a whole that cannot be divided has no
+/// groups.
 Division divide(Ledger& ledger, const std::string& subject, std::vector<Group> groups);
 
 }  // namespace tavrel::fleet

@@ -74,7 +74,8 @@ ToolStreams standardStreams() {
 }
 
 Option ToolOutput::addJsonOption(Command command) {
-  return command.addFlag("--json", json_, "Print JSON (format_version 1)");
+  const std::string description = format("Print JSON (format_version %d)", kJsonFormatVersion);
+  return command.addFlag("--json", json_, description.c_str());
 }
 
 void ToolOutput::printJson(Json object) {

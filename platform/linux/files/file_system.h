@@ -148,9 +148,9 @@ class FileSystem {
   Expected<Descriptor> lockFile(const std::string& path, const LockPatience& patience = {});
   /// The same without waiting; nothing when another process has it locked.
   Expected<std::optional<Descriptor>> lockFileIfFree(const std::string& path);
-  /// The same with the file `.lock` of a folder, which must exist.
+  /// As `lockFile`, with the file `.lock` of a folder, which must exist.
   Expected<Descriptor> lockFolder(const std::string& folder, const LockPatience& patience = {});
-  /// Opens that file without locking it.
+  /// Opens the folder's `.lock` without locking it.
   Expected<Descriptor> openFolderLock(const std::string& folder);
 
   /// Names in a folder, sorted, without those that begin with a dot; none for a missing folder.

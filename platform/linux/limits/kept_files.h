@@ -51,10 +51,10 @@ class KeptFiles {
 
   KeptUse use() const;
 
-  /// Removes what exceeds the bounds, first the files that do so alone. In place of a file that
-  /// cannot be removed, the next ones go. The newest log, the records of `today`, and what was set
-  /// aside or last changed today or yesterday always stay, and do not count when they alone exceed
-  /// the bound. Also removes metadata that a killed process left without its log.
+  /// Removes what exceeds the bounds, first files that exceed them by themselves. In place of a
+  /// file that cannot be removed, the next ones go. The newest log, the records of `today`, and
+  /// what was set aside or last changed today or yesterday always stay, and do not count when they
+  /// alone exceed the bound. Also removes metadata that a killed process left without its log.
   TrimmedFiles trim(const Bounds& bounds);
 
  private:

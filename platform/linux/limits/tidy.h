@@ -34,7 +34,8 @@ struct TidiedKind {
   std::int64_t removed = 0;        // items
   std::int64_t early = 0;          // of these, days of the store within its limit of days
   std::vector<std::int32_t> days;  // of the store, the removed ones
-  bool exceeds = false;  // what must stay takes more than the store's bounds, with no run to come
+  // The days that must stay exceed the store's bounds, and no daily run is due that would free one.
+  bool exceeds = false;
 };
 
 struct TidyReport {

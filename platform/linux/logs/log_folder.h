@@ -31,7 +31,7 @@ inline constexpr std::string_view kRefusedFolder = "refused";    // by the serve
 /// The number of withheld logs that are kept, the newest.
 inline constexpr std::size_t kWithheldLogs = 8;
 
-/// True for a day in the future: it was recorded while the clock was ahead.
+/// True for a day after tomorrow: it was recorded while the clock was ahead.
 constexpr bool isAhead(std::int64_t day, std::int64_t today) {
   return day > today + 1;
 }

@@ -54,7 +54,7 @@ class SqliteBatch {
   Status appendValues(std::int32_t day, std::string_view key,
                       std::span<const DistributionSample> samples);
   /// The waiting values, for callers that append many one by one and have checked the keys' length.
-  /// Call `limitWaiting` at least every 200,000 values.
+  /// Call `limitWaiting` after each segment's values.
   PendingDistributions& waitingDistributions() { return distributions_; }
   /// Writes them when they take too much memory.
   Status limitWaiting();
