@@ -225,10 +225,44 @@ TEST_F(LimitsTest, RunsThatContradictThemselvesTakeNothingOfOthers) {
   }
 }
 
-TEST_F(LimitsTest, RowsOutOfOrderEndTheRemoval) {
+TEST_F(LimitsTest, OtherDaysGoInsteadOfThoseThatCannotBeRead) {
+  setLastRun(kToday - 1);
+  limit({{"Store", Dictionary{{"Days", 3}}}});
+  // Their values fill pages that only a removal reads.
+  record({kToday - 9}, 1024);
+  record({kToday - 7}, 1024);
+  record(range(kToday - 9, kToday));
+  std::string values;
+  while (values.size() < 4080)
+    values += std::string("\0\0\0\0\0\0\xf8\x3f", 8);  // 1.5
+  settle();
+  const std::string content = contentOf(store.path());
+  {
+    const FailingReads reads(static_cast<off_t>(content.find(values)),
+                             static_cast<off_t>(content.rfind(values)));
+    EXPECT_EQ(tidy().failures,
+              Lines{where() + "the file cannot be read (Input/output error): check the file system "
+                              "that holds it"});
+  }
+  EXPECT_EQ(daysHeld(), (Days{kToday - 9, kToday - 7, kToday}));
+  settle();
+  std::fstream(store.path())
+          .seekp(static_cast<off_t>(content.find(values.substr(0, 400)) / 4096 * 4096))
+      << "damage";
+  limit({{"Store", Dictionary{{"Days", 1}}}});
+  log.lines.clear();
+  EXPECT_EQ(tidy().failures, Lines{});
+  EXPECT_EQ(log.lines,
+            Lines{where() +
+                  "database disk image is malformed: the file has to be set aside; it "
+                  "is now " +
+                  setAsideFiles().at(0) + " and a new store begins: inspect or remove that file"});
+}
+
+TEST_F(LimitsTest, RowsOutOfOrderReplaceTheStore) {
   setLastRun(kToday - 1);
   limit({{"Store", Dictionary{{"Days", 1}}}});
-  const std::string where = "statistics store " + store.path() + ": ";
+  const std::string reason = where() + "its rows are not in the order of their keys";
   for (const bool areScalars : {true, false}) {
     auto batch = store.beginBatch();
     for (int i = 0; i < (areScalars ? 5000 : 5); ++i) {
@@ -239,21 +273,24 @@ TEST_F(LimitsTest, RowsOutOfOrderEndTheRemoval) {
     ASSERT_TRUE((*batch)->setScalar(kToday, "com.example.today", 1));
     ASSERT_TRUE((*batch)->commit());
     sql("PRAGMA wal_checkpoint(TRUNCATE)");
-    std::string content = contentOf(store.path());
-    const std::string sound = content;
-    content.at(content.find("com.example.0000") + 12) ^= 8;  // the first key of the day
-    std::ofstream(store.path()) << content;
-    EXPECT_EQ(tidy().failures,
-              Lines{where + "its rows are not in the order of their keys: restore the "
-                            "file from a copy or move it away"});
+    const std::string sound = contentOf(store.path());
+    std::string first = sound;
+    first.at(first.find("com.example.0000") + 12) ^= 8;  // the first key of the day
     // A key that no longer has the prefix keeps others with it from being found.
-    content = sound;
-    content.at(content.find("com.example.0003")) ^= 8;
-    for (const bool isTidied : {true, false}) {
-      if (!isTidied) std::ofstream(store.path()) << content;
+    std::string other = sound;
+    other.at(other.find("com.example.0003")) ^= 8;
+    std::ofstream(store.path()) << first;
+    log.lines.clear();
+    EXPECT_EQ(tidy().failures, Lines{});
+    ASSERT_EQ(log.lines.size(), 1U);
+    EXPECT_TRUE(log.lines[0].starts_with(reason) &&
+                log.lines[0].find("; it is now ") != std::string::npos)
+        << log.lines[0];
+    for (const std::string& content : {first, other}) {
+      std::ofstream(store.path()) << content;
       const auto erased = store.erase({.prefix = "com.example."});
       ASSERT_FALSE(erased);
-      EXPECT_EQ(erased.error().message, where +
+      EXPECT_EQ(erased.error().message, where() +
                                             "it was damaged and is set aside with what was to be "
                                             "erased: remove that file");
       EXPECT_EQ(store.erase({.prefix = "com.example."})->scalars, 0U);

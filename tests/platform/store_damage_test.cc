@@ -279,36 +279,6 @@ TEST_F(StoreTest, ADamagedStoreLeavesDaysIncomplete) {
   }
 }
 
-/// During its lifetime, one read of SQLite fails, or that one and all later ones.
-class FailingReads {
- public:
-  FailingReads(int at, bool andLater) {
-    at_ = at;
-    andLater_ = andLater;
-    reads_ = 0;
-    replaceReads(read);
-  }
-  ~FailingReads() { replaceReads(nullptr); }
-  static bool hasFailed() { return reads_ >= at_; }
-
- private:
-  static ssize_t read(int file, void* into, std::size_t size, off_t offset) {
-    ++reads_;
-    const bool fails = reads_ == at_ || (andLater_ && reads_ > at_);
-    errno = EIO;  // statements turn it into SQLITE_CORRUPT
-    return fails ? -1 : pread(file, into, size, offset);
-  }
-  // With null, those of the system.
-  static void replaceReads(decltype(&read) call) {
-    sqlite3_vfs* const system = sqlite3_vfs_find(nullptr);
-    for (const char* name : {"pread", "pread64"})
-      system->xSetSystemCall(system, name, reinterpret_cast<sqlite3_syscall_ptr>(call));
-  }
-
-  static inline int at_ = 0, reads_ = 0;
-  static inline bool andLater_ = false;
-};
-
 TEST_F(StoreTest, SaysWhenMemoryIsMissing) {
   set({{"a", kToday, 1}});
   sqlite3_hard_heap_limit64(1);
@@ -343,13 +313,15 @@ TEST_F(StoreTest, AFailingReadIsNoDamage) {
         SCOPED_TRACE(std::to_string(at) + (andLater ? "+" : "") + (writes ? ", written" : ""));
         log.lines.clear();
         {
-          const FailingReads reads(at, andLater);
+          int reads = 0;
+          const FailingReads failing(
+              [&](off_t, std::size_t) { return ++reads == at || (andLater && reads > at); });
           store_ = open();
           if (writes) store_->BHClientSetValueForScalarKey("w", at);
           if (writes) store_->BHClientCheckpoint();
           const std::size_t found = writes ? 6 : readAll();
           EXPECT_TRUE(found == 6 || !log.lines.empty()) << found;
-          hasFailed = FailingReads::hasFailed();
+          hasFailed = reads >= at;
         }
         said.insert(log.lines.begin(), log.lines.end());
         EXPECT_EQ(setAsideFiles(), Lines{});

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <functional>
 #include <limits>
 #include <sqlite3.h>
 
@@ -26,6 +27,37 @@ inline void PrintTo(const Row& row, std::ostream* out) {
 using Rows = std::vector<Row>;
 
 using Sample = BHHistoryDistributionEnumerator::Sample;
+
+/// During its lifetime, reads of SQLite fail for which `fails` returns true.
+class FailingReads {
+ public:
+  using Test = std::function<bool(off_t offset, std::size_t size)>;
+  explicit FailingReads(Test fails) {
+    fails_ = std::move(fails);
+    replaceReads(read);
+  }
+  /// Those of bytes from `first` on, before `end`.
+  FailingReads(off_t first, off_t end)
+      : FailingReads([first, end](off_t from, std::size_t size) {
+          return from < end && first < from + static_cast<off_t>(size);
+        }) {}
+  ~FailingReads() { replaceReads(nullptr); }
+
+ private:
+  static ssize_t read(int file, void* into, std::size_t size, off_t offset) {
+    if (!fails_(offset, size)) return pread(file, into, size, offset);
+    errno = EIO;  // statements turn it into SQLITE_CORRUPT
+    return -1;
+  }
+  // With null, those of the system.
+  static void replaceReads(decltype(&read) call) {
+    sqlite3_vfs* const system = sqlite3_vfs_find(nullptr);
+    for (const char* name : {"pread", "pread64"})
+      system->xSetSystemCall(system, name, reinterpret_cast<sqlite3_syscall_ptr>(call));
+  }
+
+  static inline Test fails_;
+};
 
 class StoreTest : public testing::Test, protected DeviceServices {
  protected:

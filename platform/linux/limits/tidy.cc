@@ -1,6 +1,7 @@
 #include "platform/linux/limits/tidy.h"
 
 #include <algorithm>
+#include <utility>
 
 #include "platform/persisted_state.h"
 
@@ -100,22 +101,40 @@ std::vector<std::int32_t> Tidy::removalOrder(const std::vector<std::int32_t>& da
   return order;
 }
 
+// A damaged store is set aside. In one that the device cannot read in part, other days go instead
+// of those that stay.
 void Tidy::trimStore(const Bounds& bounds, TidiedKind& tidied, std::vector<std::string>& failures) {
-  const auto fail = [&](const Error& error) { failures.push_back(error.message); };
   auto trim = store_.beginTrim();
-  if (!trim) return fail(trim.error());
+  if (!trim) return failures.push_back(trim.error().message);
   if (!*trim) return;
+  const auto end = [&](const Error& error) {
+    const Status replaced = store_.replaceDamaged(*std::move(trim), error);
+    if (!replaced) failures.push_back(replaced.error().message);
+    return static_cast<bool>(replaced);
+  };
   const auto days = (*trim)->days();
-  if (!days) return fail(days.error());
+  if (!days) {
+    end(days.error());
+    return;
+  }
   auto left = static_cast<std::int64_t>(days->size());
   auto bytes = (*trim)->bytesInUse();
   const auto exceeds = [&] { return left > bounds.days || (bytes && *bytes > bounds.bytes); };
+  bool isPartlyUnreadable = false;
   for (const std::int32_t day : removalOrder(*days)) {
-    if (!bytes) return fail(bytes.error());
-    if (!exceeds()) break;
+    if (!bytes || !exceeds()) break;
     if (Status removed = (*trim)->removeDay(day); !removed) {
-      fail(removed.error());
-      break;
+      if (!(*trim)->damage()) {
+        failures.push_back(removed.error().message);
+        break;
+      }
+      // The second look reads the whole store: once is enough.
+      if (std::exchange(isPartlyUnreadable, true)) continue;
+      if (end(removed.error())) return;
+      trim = store_.beginTrim();
+      if (!trim) return failures.push_back(trim.error().message);
+      if (!*trim) return;
+      continue;
     }
     tidied.days.push_back(day);
     ++tidied.removed;
@@ -123,14 +142,17 @@ void Tidy::trimStore(const Bounds& bounds, TidiedKind& tidied, std::vector<std::
     --left;
     bytes = (*trim)->bytesInUse();
   }
-  if (!bytes) return fail(bytes.error());
+  if (!bytes) {
+    end(bytes.error());
+    return;
+  }
   // Until the run of yesterday, which frees that day, the device may well keep its limits.
   const std::int32_t yesterday = previousDay(store_.BHDaysSince1970());
   const bool isRunDue =
       std::ranges::binary_search(*days, yesterday) && lastRunDay().value_or(INT64_MIN) < yesterday;
   tidied.exceeds = failures.empty() && exceeds() && !isRunDue;
   const Status given = (*trim)->giveBack(reserveOf(*bytes, left, bounds));
-  if (!given) fail(given.error());
+  if (!given && !isPartlyUnreadable) end(given.error());
 }
 
 // The counts are committed, or kept beside the store when there is no room.

@@ -83,12 +83,8 @@ class SqliteBatch {
   /// Keeps the changes and ends the batch.
   Status commit();
 
-  /// Damage in the store that has made an operation fail, and the damaged file.
-  struct Damage {
-    std::optional<FileIdentity> file;
-    StoreFailure failure;
-  };
-  const std::optional<Damage>& damage() const { return damage_; }
+  /// Damage in the store that has made an operation fail.
+  const std::optional<StoreDamage>& damage() const { return damage_; }
 
  private:
   friend class SqliteStore;
@@ -127,7 +123,7 @@ class SqliteBatch {
   SqliteConnection connection_;
   StoreSite site_;
   const std::optional<FileIdentity> file_;
-  std::optional<Damage> damage_;
+  std::optional<StoreDamage> damage_;
   KeptValues kept_;
   std::optional<std::uint32_t> takenNumber_;  // of the last values taken in
   std::unique_ptr<Statements> statements_;

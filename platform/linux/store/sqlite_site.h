@@ -60,6 +60,12 @@ struct StoreLoss {
   StoreFailure failure;  // why the rows are missing
 };
 
+/// Damage that has made an operation fail, and the damaged file.
+struct StoreDamage {
+  std::optional<FileIdentity> file;
+  StoreFailure failure;
+};
+
 /// The store's path, and the services to which failures are reported, which must outlive it.
 struct StoreSite {
   std::string path;

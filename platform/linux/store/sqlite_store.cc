@@ -223,11 +223,8 @@ Expected<std::unique_ptr<SqliteBatch>> SqliteStore::beginBatch(Sharing sharing) 
   return batch;
 }
 
-Status SqliteStore::replaceDamaged(std::unique_ptr<SqliteBatch> batch, const Error& error) {
-  const auto damage = batch->damage();
-  batch.reset();
-  if (!damage) return error;
-  if (const auto obstacle = site_.setAside(damage->file, damage->failure)) {
+Status SqliteStore::setAside(const StoreDamage& damage) {
+  if (const auto obstacle = site_.setAside(damage.file, damage.failure)) {
     return Error{site_.describe(*obstacle)};
   }
   return Done{};
@@ -244,7 +241,7 @@ Expected<std::unique_ptr<SqliteTrim>> SqliteStore::beginTrim() {
       const StoreFolderLock lock(site_.path, *site_.busy);
       StoreErasure::dropPages(connection);
     }
-    trim = std::make_unique<SqliteTrim>(std::move(connection), site_);
+    trim = std::make_unique<SqliteTrim>(std::move(connection), site_, identity);
   });
   if (failure) return Error{site_.describe(*failure)};
   return trim;

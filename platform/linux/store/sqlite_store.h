@@ -62,10 +62,15 @@ class SqliteStore : public StatisticsStore {
   /// Begins a transaction of many changes; creates the store when there is none.
   Expected<std::unique_ptr<SqliteBatch>> beginBatch(Sharing sharing = Sharing::WithReaders);
 
-  /// Discards a batch that has failed with `error`. Succeeds when the store was damaged and has
-  /// been set aside: the next batch fills a new one. Otherwise returns the error, with what
-  /// prevented that.
-  Status replaceDamaged(std::unique_ptr<SqliteBatch> batch, const Error& error);
+  /// Discards a batch or a trim that has failed with `error`. Succeeds when the store was damaged
+  /// and has been set aside: the next batch fills a new one. Otherwise returns the error, or why
+  /// the store was not set aside.
+  template <class Work>
+  Status replaceDamaged(std::unique_ptr<Work> work, const Error& error) {
+    const std::optional<StoreDamage> damage = work->damage();
+    work.reset();
+    return damage ? setAside(*damage) : error;
+  }
 
   /// Opens the store to remove days; null when there is none.
   Expected<std::unique_ptr<SqliteTrim>> beginTrim();
@@ -82,6 +87,7 @@ class SqliteStore : public StatisticsStore {
   Expected<ErasedRows> erase(const RowRange& range);
 
  private:
+  Status setAside(const StoreDamage& damage);
   SqliteConnection openForWriting(Sharing sharing);
   /// Keeps the values that `failure` has left uncommitted. False when they could not be kept.
   bool keep(const StoreFailure& failure);

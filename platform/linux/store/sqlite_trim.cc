@@ -82,13 +82,27 @@ std::int64_t bytesInUseOf(SqliteConnection& connection) {
          (hasSegments ? segment_table::positionBytes(connection) : 0);
 }
 
+template <class Operation>
+std::invoke_result_t<Operation> SqliteTrim::attempt(Operation operation) {
+  damage_.reset();
+  try {
+    return operation();
+  } catch (const StoreFailure& failure) {
+    return note(failure);
+  }
+}
+
+Error SqliteTrim::note(const StoreFailure& failure) {
+  if (failure.fault == StoreFault::Damaged) damage_ = {file_, failure};
+  return Error{site_.describe(failure)};
+}
+
 Expected<std::vector<std::int32_t>> SqliteTrim::days() {
-  return site_.attempt(
-      [&]() -> Expected<std::vector<std::int32_t>> { return daysIn(connection_); });
+  return attempt([&]() -> Expected<std::vector<std::int32_t>> { return daysIn(connection_); });
 }
 
 Expected<std::int64_t> SqliteTrim::bytesInUse() {
-  return site_.attempt([&]() -> Expected<std::int64_t> { return bytesInUseOf(connection_); });
+  return attempt([&]() -> Expected<std::int64_t> { return bytesInUseOf(connection_); });
 }
 
 // Runs `step` repeatedly, each time in a transaction, until it returns false. On a full disk,
@@ -115,7 +129,7 @@ Status SqliteTrim::inSteps(std::int64_t budget, const std::function<bool(std::in
         // SQLite has rolled back already.
       }
       const bool mayFit = failure.fault == StoreFault::Device && (hasAdvanced || budget > 1);
-      if (!mayFit) return Error{site_.describe(failure)};
+      if (!mayFit) return note(failure);
       if (!hasAdvanced) budget = std::max<std::int64_t>(budget / 16, 1);
       hasAdvanced = false;
       limitLog(0);
@@ -125,7 +139,9 @@ Status SqliteTrim::inSteps(std::int64_t budget, const std::function<bool(std::in
 }
 
 Status SqliteTrim::removeDay(std::int32_t day) {
-  return inSteps(kStepRows, [&](std::int64_t budget) { return removeSome(day, budget); });
+  return attempt([&] {
+    return inSteps(kStepRows, [&](std::int64_t budget) { return removeSome(day, budget); });
+  });
 }
 
 // False when the day has gone.
@@ -222,7 +238,7 @@ bool SqliteTrim::canBeConverted(std::int64_t bytes) {
 }
 
 Status SqliteTrim::giveBack(std::int64_t freeBytesKept) {
-  return site_.attempt([&]() -> Status {
+  return attempt([&]() -> Status {
     const std::int64_t pageBytes = connection_.integer("PRAGMA page_size");
     const auto surplus = [&] {
       return connection_.integer("PRAGMA freelist_count") - freeBytesKept / pageBytes;

@@ -13,7 +13,9 @@
 
 #include <cstdint>
 #include <functional>
+#include <optional>
 #include <sys/types.h>
+#include <type_traits>
 #include <utility>
 #include <vector>
 
@@ -25,8 +27,9 @@ namespace tavrel {
 
 class SqliteTrim {
  public:
-  SqliteTrim(SqliteConnection connection, const StoreSite& site)
-      : connection_(std::move(connection)), site_(site) {}
+  /// `file`: the store that the connection has opened.
+  SqliteTrim(SqliteConnection connection, const StoreSite& site, std::optional<FileIdentity> file)
+      : connection_(std::move(connection)), site_(site), file_(file) {}
 
   /// The days that have statistics, ascending. Costs two look-ups per day.
   Expected<std::vector<std::int32_t>> days();
@@ -44,9 +47,16 @@ class SqliteTrim {
   /// keeps its free pages for later values.
   Status giveBack(std::int64_t freeBytesKept);
 
+  /// Damage in the store that has made the last operation fail.
+  const std::optional<StoreDamage>& damage() const { return damage_; }
+
  private:
   struct Row;
 
+  /// The outcome of `operation`, or the failure that it throws.
+  template <class Operation>
+  std::invoke_result_t<Operation> attempt(Operation operation);
+  Error note(const StoreFailure& failure);
   Status inSteps(std::int64_t budget, const std::function<bool(std::int64_t budget)>& step);
   bool removeSome(std::int32_t day, std::int64_t budget);
   std::int64_t removeScalars(std::int32_t day, std::int64_t budget);
@@ -57,6 +67,8 @@ class SqliteTrim {
 
   SqliteConnection connection_;
   StoreSite site_;
+  const std::optional<FileIdentity> file_;
+  std::optional<StoreDamage> damage_;
 };
 
 /// As `SqliteTrim::days`; throws `StoreFailure`.
