@@ -127,16 +127,29 @@ TEST_F(FoldTest, UsersRecordTheirKeysAlone) {
                                              {.key = "", .lastDay = INT32_MAX});
     EXPECT_EQ(shown->missingValues(),
               (Lines{"1 segment with values that wait is not shown: run 'tavrelctl stat fold'",
-                     "1 segment with values that wait is not shown: try again when the users in " +
-                         file.string() + " can be looked up"}));
+                     "1 segment with values that wait is not shown: try again when " +
+                         file.string() + " can be read and its users looked up"}));
   }
   unknown = foldNow();
   EXPECT_EQ(unknown.failure,
             file.string() +
-                " names users who cannot be looked up now; what users other than root recorded "
-                "waits for the next fold");
+                " cannot be read now, or names users who cannot be looked up; what users other "
+                "than root recorded waits for the next fold");
   EXPECT_EQ(log.lines, Lines{file.string() + ": cannot look up the user \"proxy\": Too many "
                                              "open files in system"});
+  // Nor is anything refused while the file cannot be read.
+  lookUpResult = 0;
+  std::filesystem::rename(file, root / "list");
+  for (const bool isLoop : {true, false}) {
+    if (isLoop) {
+      std::filesystem::create_symlink(file.filename(), file);
+    } else {
+      std::filesystem::create_directory(file);
+    }
+    EXPECT_EQ(foldNow().failure, unknown.failure);
+    std::filesystem::remove(file);
+  }
+  std::filesystem::rename(root / "list", file);
   lookUpResult = ENOENT;
   const FoldReport refusing = foldNow();
   lookUpResult = 0;

@@ -15,8 +15,12 @@ plist::Dictionary readDictionaryFile(FileSystem& files, PropertyListCoding& prop
     log.write(LogLevel::Error, bytes.error().message);
     return {};
   }
-  if (!*bytes) return {};
-  const auto value = propertyLists.decode(asBytes(**bytes));
+  return *bytes ? dictionaryIn(**bytes, propertyLists, log, path) : plist::Dictionary();
+}
+
+plist::Dictionary dictionaryIn(std::string_view bytes, PropertyListCoding& propertyLists,
+                               SystemLog& log, const std::string& path) {
+  const auto value = propertyLists.decode(asBytes(bytes));
   if (value && value->dictionary()) return value->dictionary();
   const std::string reason = value ? "it is not a dictionary" : value.error().message;
   log.log(LogLevel::Error, "cannot read %s: %s; repair or remove it", path, reason);
@@ -25,9 +29,12 @@ plist::Dictionary readDictionaryFile(FileSystem& files, PropertyListCoding& prop
 
 std::string reasonToDistrust(const std::string& path) {
   const auto status = FileSystem::status(path);
-  if (!status) return "its owner is unknown: " + systemText(errno);
-  if ((status->st_uid == 0 || status->st_uid == geteuid()) &&
-      (status->st_mode & (S_IWGRP | S_IWOTH)) == 0) {
+  return status ? reasonToDistrust(*status) : "its owner is unknown: " + systemText(errno);
+}
+
+std::string reasonToDistrust(const struct stat& status) {
+  if ((status.st_uid == 0 || status.st_uid == geteuid()) &&
+      (status.st_mode & (S_IWGRP | S_IWOTH)) == 0) {
     return {};
   }
   return "users other than root may write it: make root its owner and set mode 0644";

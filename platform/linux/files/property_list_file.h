@@ -2,6 +2,8 @@
 #pragma once
 
 #include <string>
+#include <string_view>
+#include <sys/stat.h>
 
 #include "base/plist.h"
 #include "platform/linux/files/file_system.h"
@@ -15,8 +17,14 @@ namespace tavrel {
 plist::Dictionary readDictionaryFile(FileSystem& files, PropertyListCoding& propertyLists,
                                      SystemLog& log, const std::string& path);
 
+/// The dictionary in the bytes of the file `path`. An empty handle, with a line in the system log,
+/// when they are no dictionary.
+plist::Dictionary dictionaryIn(std::string_view bytes, PropertyListCoding& propertyLists,
+                               SystemLog& log, const std::string& path);
+
 /// Why a file of settings that decide about other users' data cannot be trusted: users other than
 /// root and this process's may write it, or its owner is unknown. Empty when it can be trusted.
 std::string reasonToDistrust(const std::string& path);
+std::string reasonToDistrust(const struct stat& status);
 
 }  // namespace tavrel

@@ -128,8 +128,8 @@ Expected<RecordedHistory> RecordedHistory::open(const DeviceRoot& root, SqliteSt
                                      " not shown: " + advice);
   };
   addMissing(history.waiting_->leftOut(), "run 'tavrelctl stat fold'");
-  addMissing(history.waiting_->withoutRights(),
-             "try again when the users in " + root.path(kRecordersFile) + " can be looked up");
+  addMissing(history.waiting_->withoutRights(), "try again when " + root.path(kRecordersFile) +
+                                                    " can be read and its users looked up");
   if (isOvertaken) {
     history.missingValues_.emplace_back(
         "folds took values during each attempt to read them, and some are not shown: run it again");

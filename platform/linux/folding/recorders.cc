@@ -8,6 +8,7 @@
 #include <pwd.h>
 #include <unistd.h>
 
+#include "base/limits.h"
 #include "base/text.h"
 #include "client/segment_format.h"
 #include "platform/linux/files/property_list_file.h"
@@ -55,21 +56,29 @@ Recorders Recorders::read(const DeviceRoot& root, FileSystem& files,
   Recorders recorders;
   const std::string path = root.path(kRecordersFile);
   const auto status = FileSystem::status(path);
-  if (!status) {
-    struct stat link {};
-    if (lstat(path.c_str(), &link) == 0) {
-      log.log(LogLevel::Error,
-              "%s is ignored: it is a link that leads nowhere; repair or remove it", path);
-    } else if (errno != ENOENT && errno != ENOTDIR) {
-      log.write(LogLevel::Error, systemError("read", path).message);
-    }
-    return recorders;
+  const int code = errno;
+  const bool isAbsent = !status && (code == ENOENT || code == ENOTDIR);
+  struct stat link {};
+  if (isAbsent && lstat(path.c_str(), &link) == 0) {
+    log.log(LogLevel::Error, "%s is ignored: it is a link that leads nowhere; repair or remove it",
+            path);
   }
-  if (const auto reason = reasonToDistrust(path); !reason.empty()) {
+  if (isAbsent) return recorders;
+  const std::string reason = status ? reasonToDistrust(*status) : std::string();
+  if (!reason.empty()) {
     log.log(LogLevel::Error, "%s is ignored: %s", path, reason);
     return recorders;
   }
-  const plist::Dictionary content = readDictionaryFile(files, propertyLists, log, path);
+  const auto bytes = status ? files.readIfPresent(path, limits::kPropertyListBytes)
+                            : systemError("read", path, code);
+  if (!bytes) {
+    // It may list users: what would be refused without it has to wait.
+    recorders.areRightsKnown_ = false;
+    log.write(LogLevel::Error, bytes.error().message);
+    return recorders;
+  }
+  if (!*bytes) return recorders;
+  const plist::Dictionary content = dictionaryIn(**bytes, propertyLists, log, path);
   if (!content) return recorders;
   for (const plist::Entry& entry : content)
     recorders.add(entry.key.view(), entry.value, path, log);
@@ -94,7 +103,7 @@ void Recorders::add(std::string_view user, const plist::Value& prefixes, const s
   if (number) {
     listed_.insert(*number);
   } else if (!found) {
-    areUsersKnown_ = false;
+    areRightsKnown_ = false;
     log.write(LogLevel::Error, path + ": " + found.error().message);
   } else {
     // A fold each hour must not fill the journal with it.

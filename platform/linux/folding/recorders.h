@@ -35,15 +35,16 @@ class Recorders {
 
   /// Reads `kRecordersFile`. A file that is damaged, that users other than root and this user could
   /// have written, or that is a dangling link counts as absent, and so does an entry without an
-  /// array of prefixes. Each of these, and each user who does not exist or cannot be looked up, is
-  /// a line in the log.
+  /// array of prefixes. Each of these, a file that cannot be read, and each user who does not exist
+  /// or cannot be looked up is a line in the log.
   static Recorders read(const DeviceRoot& root, FileSystem& files,
                         PropertyListCoding& propertyLists, SystemLog& log);
 
   bool mayRecord(std::uint32_t user, std::string_view key) const;
 
-  /// False when some user could not be looked up and `user` is not root: then `mayRecord` may err.
-  bool areRightsKnown(std::uint32_t user) const { return user == 0 || areUsersKnown_; }
+  /// False when the file could not be read, or some user not be looked up, and `user` is not root:
+  /// then `mayRecord` may err.
+  bool areRightsKnown(std::uint32_t user) const { return user == 0 || areRightsKnown_; }
 
  private:
   void add(std::string_view user, const plist::Value& prefixes, const std::string& path,
@@ -54,7 +55,7 @@ class Recorders {
 
   Users users_;
   std::set<std::uint32_t> listed_;
-  bool areUsersKnown_ = true;
+  bool areRightsKnown_ = true;
 };
 
 }  // namespace tavrel

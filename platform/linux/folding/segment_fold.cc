@@ -416,8 +416,8 @@ FoldReport SegmentFold::run() {
       report.failure = done.error().message + "; what programs recorded waits for the next fold";
     } else if (report.withoutRights > 0) {
       report.failure = root_.path(kRecordersFile) +
-                       " names users who cannot be looked up now; what users other than root "
-                       "recorded waits for the next fold";
+                       " cannot be read now, or names users who cannot be looked up; what users "
+                       "other than root recorded waits for the next fold";
     }
   }
   notes->save();
