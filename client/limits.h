@@ -33,6 +33,10 @@ enum {
    * it, too. */
   kSegmentsPerFold = 127,
 
+  /* No segment begins while less than this part of the tmpfs, usually all of /run, is free: when
+   * folds fail for weeks, segments of ended processes would fill it. */
+  kReservedPart = 8,
+
   /* Names tried for a new file. They contain a time in nanoseconds; a collision means that a
    * process in another PID namespace began in the same nanosecond. */
   kNameAttempts = 8

@@ -99,8 +99,8 @@ static const char* textOf(BHClientStatus status) {
     case BHClientStatusNotInMemory:
       return "/run/tavrel/stat is not on a tmpfs: nothing is recorded";
     case BHClientStatusNoSpace:
-      return "the tmpfs of /run/tavrel/stat, or a limit of the process, is exhausted: nothing is "
-             "recorded";
+      return "less than an eighth of the tmpfs of /run/tavrel/stat is free, or a limit of the "
+             "process is exhausted: nothing is recorded";
     case BHClientStatusUnsupported:
       return "the kernel lacks MADV_WIPEONFORK, or TAVREL_ROOT is too long or relative to a folder "
              "that is gone: nothing is recorded";

@@ -181,6 +181,8 @@ struct Segment* bhBeginSegment(const char* folder, struct SegmentName* name,
   struct stat entries;
   if (fstatfs(directory, &fileSystem) != 0 || fileSystem.f_type != TMPFS_MAGIC) {
     *status = BHClientStatusNotInMemory;
+  } else if (fileSystem.f_bavail < fileSystem.f_blocks / kReservedPart) {
+    *status = BHClientStatusNoSpace;
   } else {
     segment = beginIn(directory, name, status);
     /* On a tmpfs, the size of a folder is 20 bytes per entry, "." and ".." included. */

@@ -429,6 +429,17 @@ TEST_F(Recording, AFullFileSystemDropsAndCounts) {
     records.clear();
     dropped = 0;
   }
+  // The last eighth, here 4 of 32 pages, is left to others.
+  for (const auto& [pages, status] :
+       {std::pair(28U, BHClientStatusRecording), {29U, BHClientStatusNoSpace}}) {
+    std::ofstream(folder / "others") << std::string(pages * 4096, 'x');
+    run([=, expected = status] {
+      add(1);
+      EXPECT_EQ(BHClientGetStatus(nullptr), expected);
+    });
+    std::filesystem::remove(folder / "others");
+    fold();
+  }
   umount(folder.c_str());
 }
 

@@ -144,8 +144,8 @@ Expected<std::unique_ptr<ValueRecorder>> openRecorder(ToolContext& context) {
           format("cannot create files in %s: run as root or join the group brimhold", folder)};
     case BHClientStatusNoSpace:
       return Error{
-          format("cannot record in %s: memory or a limit of this process is exhausted: "
-                 "run 'tavrelctl stat fold' or free space in /run",
+          format("cannot record in %s: less than an eighth of its tmpfs is free, or a limit of "
+                 "this process is exhausted: run 'tavrelctl stat fold' or free space in /run",
                  folder)};
     case BHClientStatusUnsupported:
       return Error{

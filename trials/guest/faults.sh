@@ -150,8 +150,8 @@ cover "size=64k" $folders
 for folder in $folders; do mkdir "$folder/Library"; done
 for folder in $folders; do cat /dev/zero >"$folder/full" 2>/dev/null; done
 expect "units with full folders" "collect: exit-code 1
-  tavrelctl: cannot record in /run/tavrel/stat: memory or a limit of this process is exhausted: run \
-'tavrelctl stat fold' or free space in /run
+  tavrelctl: cannot record in /run/tavrel/stat: less than an eighth of its tmpfs is free, or a limit of \
+this process is exhausted: run 'tavrelctl stat fold' or free space in /run
 fold: success 0
 daily: exit-code 0
   this run will not be remembered: cannot write /var/lib/tavrel/last-run.plist: No space left on \
@@ -174,11 +174,11 @@ metrics: exit-code 1
   tavrelctl: cannot write /run/tavrel/metrics/tavrel.prom: No space left on device; free some space
 tavrel: active success 0
 tavrel-sampler: activating exit-code 1
-  tavrelctl: cannot record in /run/tavrel/stat: memory or a limit of this process is exhausted: run \
-'tavrelctl stat fold' or free space in /run
+  tavrelctl: cannot record in /run/tavrel/stat: less than an eighth of its tmpfs is free, or a limit of \
+this process is exhausted: run 'tavrelctl stat fold' or free space in /run
 tavrel-statsd: active success 0
-  tavrel-statsd: the tmpfs of /run/tavrel/stat, or a limit of the process, is exhausted: nothing is \
-recorded" \
+  tavrel-statsd: less than an eighth of the tmpfs of /run/tavrel/stat is free, or a limit of the \
+process is exhausted: nothing is recorded" \
   "$(outcomes)"
 # shellcheck disable=SC2086
 uncover $folders

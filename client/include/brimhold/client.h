@@ -97,7 +97,7 @@ typedef enum BHClientStatus {
   BHClientStatusNoFolder = 2,    /* the device has no folder for segments */
   BHClientStatusNotAllowed = 3,  /* this user may not create files in it */
   BHClientStatusNotInMemory = 4, /* the folder is not on a tmpfs */
-  BHClientStatusNoSpace = 5,     /* the tmpfs or a limit of the process is exhausted */
+  BHClientStatusNoSpace = 5,     /* the tmpfs is nearly full, or a limit is reached */
   BHClientStatusUnsupported = 6, /* the kernel is older than 4.14, or TAVREL_ROOT is unusable */
   BHClientStatusFailed = 7,      /* the system failed for another reason */
   BHClientStatusFull = 8,        /* values are dropped until a fold makes room */

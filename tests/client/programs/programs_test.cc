@@ -54,8 +54,8 @@ TEST_F(Programs, TheToolSaysWhyItCannotRecord) {
   // A file size limit that is too small belongs to the process.
   EXPECT_EQ(outputOf("ulimit -f 8; " + kTool + "stat add n 1", 1),
             "tavrelctl: cannot record in " + folder.string() +
-                ": memory or a limit of this process is exhausted: run 'tavrelctl stat fold' "
-                "or free space in /run\n");
+                ": less than an eighth of its tmpfs is free, or a limit of this process is "
+                "exhausted: run 'tavrelctl stat fold' or free space in /run\n");
   EXPECT_EQ(foldedScalars(), "com.norvane.n=2 n=1 ");
   std::filesystem::remove_all(folder);
   std::filesystem::remove_all(root / "var");
