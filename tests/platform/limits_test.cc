@@ -243,6 +243,7 @@ TEST_F(LimitsTest, OtherDaysGoInsteadOfThoseThatCannotBeRead) {
     EXPECT_EQ(tidy().failures,
               Lines{where() + "the file cannot be read (Input/output error): check the file system "
                               "that holds it"});
+    EXPECT_TRUE(std::filesystem::exists(store.path() + "-unreadable"));
   }
   EXPECT_EQ(daysHeld(), (Days{kToday - 9, kToday - 7, kToday}));
   settle();
