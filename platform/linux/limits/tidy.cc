@@ -109,20 +109,24 @@ void Tidy::trimStore(const Bounds& bounds, TidiedKind& tidied, std::vector<std::
   auto trim = store_.beginTrim();
   if (!trim) return failures.push_back(trim.error().message);
   if (!*trim) return;
-  const auto end = [&](const Error& error) {
+  bool isPartlyUnreadable = false;
+  // The second look reads the whole store: once is enough.
+  const auto goesOnAfter = [&](const Error& error) {
+    if (std::exchange(isPartlyUnreadable, true)) return true;
+    const bool looksDamaged = (*trim)->damage().has_value();
     const Status replaced = store_.replaceDamaged(*std::move(trim), error);
-    if (!replaced) failures.push_back(replaced.error().message);
-    return static_cast<bool>(replaced);
+    if (replaced) return false;
+    failures.push_back(replaced.error().message);
+    if (!looksDamaged) return false;
+    trim = store_.beginTrim();
+    return trim && *trim;
   };
-  const auto days = (*trim)->days();
-  if (!days) {
-    end(days.error());
-    return;
-  }
+  auto days = (*trim)->days();
+  if (!days && goesOnAfter(days.error())) days = (*trim)->readableDays();
+  if (!days) return;
   auto left = static_cast<std::int64_t>(days->size());
   auto bytes = (*trim)->bytesInUse();
   const auto exceeds = [&] { return left > bounds.days || (bytes && *bytes > bounds.bytes); };
-  bool isPartlyUnreadable = false;
   for (const std::int32_t day : removalOrder(*days)) {
     if (!bytes || !exceeds()) break;
     if (Status removed = (*trim)->removeDay(day); !removed) {
@@ -130,12 +134,7 @@ void Tidy::trimStore(const Bounds& bounds, TidiedKind& tidied, std::vector<std::
         failures.push_back(removed.error().message);
         break;
       }
-      // The second look reads the whole store: once is enough.
-      if (std::exchange(isPartlyUnreadable, true)) continue;
-      if (end(removed.error())) return;
-      trim = store_.beginTrim();
-      if (!trim) return failures.push_back(trim.error().message);
-      if (!*trim) return;
+      if (!goesOnAfter(removed.error())) return;
       continue;
     }
     tidied.days.push_back(day);
@@ -144,17 +143,14 @@ void Tidy::trimStore(const Bounds& bounds, TidiedKind& tidied, std::vector<std::
     --left;
     bytes = (*trim)->bytesInUse();
   }
-  if (!bytes) {
-    end(bytes.error());
-    return;
-  }
+  if (!bytes) return static_cast<void>(goesOnAfter(bytes.error()));
   // Until the run of yesterday, which frees that day, the device may well keep its limits.
   const std::int32_t yesterday = previousDay(store_.BHDaysSince1970());
   const bool isRunDue =
       std::ranges::binary_search(*days, yesterday) && lastRunDay().value_or(INT64_MIN) < yesterday;
   tidied.exceeds = failures.empty() && exceeds() && !isRunDue;
   const Status given = (*trim)->giveBack(reserveOf(*bytes, left, bounds));
-  if (!given && !isPartlyUnreadable) end(given.error());
+  if (!given) goesOnAfter(given.error());
 }
 
 // The counts are committed, or kept beside the store when there is no room.

@@ -2,7 +2,7 @@
 
 #include <algorithm>
 #include <functional>
-#include <iterator>
+#include <set>
 #include <string>
 #include <sys/statvfs.h>
 #include <time.h>
@@ -38,6 +38,24 @@ constexpr std::int64_t kConversionRoom = 3;
 
 constexpr std::int64_t kNoVacuum = 0;
 
+constexpr const char* kTablesByDay[] = {"scalars", "distributions"};
+
+void addDaysIn(SqliteConnection& connection, const char* table, std::set<std::int32_t>& days) {
+  // Damage, or another program, may leave days that exceed 32 bits, have fractions, or are no
+  // numbers, which sort after all numbers.
+  SqliteStatement next(connection, std::string("SELECT day FROM ") + table +
+                                       " WHERE day BETWEEN ?1 AND 2147483647"
+                                       " ORDER BY day LIMIT 1");
+  for (std::int64_t wanted = INT32_MIN;;) {
+    next.bind(1, wanted);
+    if (!next.step()) break;
+    const std::int64_t day = next.integer(0);
+    days.insert(static_cast<std::int32_t>(day));
+    wanted = day + 1;
+    next.reset();
+  }
+}
+
 }  // namespace
 
 // A distribution, and its runs that remain to be removed.
@@ -48,29 +66,10 @@ struct SqliteTrim::Row {
 };
 
 std::vector<std::int32_t> daysIn(SqliteConnection& connection) {
-  std::vector<std::int32_t> days;
-  for (const char* table : {"scalars", "distributions"}) {
-    // Damage, or another program, may leave days that exceed 32 bits, have fractions, or are no
-    // numbers, which sort after all numbers.
-    SqliteStatement next(connection, std::string("SELECT day FROM ") + table +
-                                         " WHERE day BETWEEN ?1 AND 2147483647"
-                                         " ORDER BY day LIMIT 1");
-    std::vector<std::int32_t> found;
-    for (std::int64_t wanted = INT32_MIN;;) {
-      next.bind(1, wanted);
-      if (!next.step()) break;
-      const std::int64_t day = next.integer(0);
-      found.push_back(static_cast<std::int32_t>(day));
-      wanted = day + 1;
-      next.reset();
-    }
-    next.reset();
-    std::vector<std::int32_t> merged;
-    std::set_union(days.begin(), days.end(), found.begin(), found.end(),
-                   std::back_inserter(merged));
-    days = std::move(merged);
-  }
-  return days;
+  std::set<std::int32_t> days;
+  for (const char* table : kTablesByDay)
+    addDaysIn(connection, table, days);
+  return {days.begin(), days.end()};
 }
 
 std::int64_t bytesInUseOf(SqliteConnection& connection) {
@@ -99,6 +98,18 @@ Error SqliteTrim::note(const StoreFailure& failure) {
 
 Expected<std::vector<std::int32_t>> SqliteTrim::days() {
   return attempt([&]() -> Expected<std::vector<std::int32_t>> { return daysIn(connection_); });
+}
+
+std::vector<std::int32_t> SqliteTrim::readableDays() {
+  std::set<std::int32_t> days;
+  for (const char* table : kTablesByDay) {
+    try {
+      addDaysIn(connection_, table, days);
+    } catch (const StoreFailure&) {
+      // Most of its days are in the other table as well.
+    }
+  }
+  return {days.begin(), days.end()};
 }
 
 Expected<std::int64_t> SqliteTrim::bytesInUse() {

@@ -33,6 +33,8 @@ class SqliteTrim {
 
   /// The days that have statistics, ascending. Costs two look-ups per day.
   Expected<std::vector<std::int32_t>> days();
+  /// Those that can be found where the device cannot read part of the store.
+  std::vector<std::int32_t> readableDays();
 
   /// Bytes of the pages in use, without the log and without the positions of segments, which belong
   /// to no day.
