@@ -13,9 +13,11 @@
 #include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
+#include <utility>
 #include <vector>
 
 #include "platform/linux/files/device_root.h"
+#include "platform/linux/files/file_system.h"
 #include "platform/system_log.h"
 
 namespace tavrel {
@@ -26,6 +28,18 @@ inline std::string contentOf(const std::filesystem::path& path) {
   std::ifstream file(path, std::ios::binary);
   return {std::istreambuf_iterator<char>(file), {}};
 }
+
+/// Lets a test interfere, once, before a file whose path has this part is opened.
+struct MeddlingFiles : FileSystem {
+  int openFile(const char* path, int flags, mode_t mode) override {
+    if (std::string_view(path).find(part) != std::string_view::npos) {
+      if (const auto now = std::exchange(meddle, nullptr)) now();
+    }
+    return FileSystem::openFile(path, flags, mode);
+  }
+  std::string part;
+  std::function<void()> meddle;
+};
 
 /// Removes itself with all its contents at the end.
 class TemporaryRoot {

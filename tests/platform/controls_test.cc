@@ -1,4 +1,6 @@
 
+#include <sys/sysinfo.h>
+
 #include "platform/linux/device/linux_dynamic_loader.h"
 #include "platform/linux/device/linux_system_controls.h"
 #include "tests/devices/device_services.h"
@@ -57,17 +59,15 @@ TEST_F(ControlsTest, GivesRecordedValuesBeforeTheKernels) {
 
 TEST_F(ControlsTest, ReadsSwapFromTheKernel) {
   write(kControls, "<plist>");  // an unusable file hides nothing
-  std::uint64_t kibibytes = 0;
-  std::ifstream meminfo("/proc/meminfo");
-  for (std::string word; meminfo >> word;) {
-    if (word == "SwapTotal:") meminfo >> kibibytes;
-  }
+  struct sysinfo machine {};
+  sysinfo(&machine);
   std::array<std::byte, kSwapUsageBytes> record{};
   const auto result = controls.read("vm.swapusage", record);
   EXPECT_EQ(result.errorNumber, 0);
   EXPECT_EQ(result.length, kSwapUsageBytes);
-  EXPECT_EQ(loadLittle64(record, 0), kibibytes * 1024);
-  EXPECT_EQ(loadLittle64(record, 8).value() + loadLittle64(record, 16).value(), kibibytes * 1024);
+  EXPECT_EQ(loadLittle64(record, 0), machine.totalswap * machine.mem_unit);
+  EXPECT_EQ(loadLittle64(record, 8).value() + loadLittle64(record, 16).value(),
+            loadLittle64(record, 0));
   EXPECT_EQ(log.lines.size(), 1U);  // read once
 
   std::string bytes;

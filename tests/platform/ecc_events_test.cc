@@ -151,21 +151,16 @@ TEST_F(EccEventsTest, ThatCannotBeCountedAreTakenBack) {
 
 TEST_F(EccEventsTest, ArePublishedByOneOfTwoProcesses) {
   count("ce_count", 5);
-  struct OtherIsFaster : FileSystem {
-    explicit OtherIsFaster(EccEventsTest& test) : device(test) {}
-    int openFile(const char* path, int flags, mode_t mode) override {
-      if (others.empty() && std::string_view(path).find("ecc-events/.") != std::string::npos) {
-        auto faster = device.openEvents();
-        others = all(faster);
-      }
-      return FileSystem::openFile(path, flags, mode);
-    }
-    EccEventsTest& device;
-    std::string others;
-  } system(*this);
+  std::string others;
+  MeddlingFiles system;
+  system.part = "ecc-events/.";
+  system.meddle = [&] {
+    auto faster = openEvents();
+    others = all(faster);
+  };
   EccEvents events(root, system, coding, log, EccEvents::Mode::Consume);
   EXPECT_EQ(all(events), "");
-  EXPECT_EQ(system.others, "1: 0 5 5; ");
+  EXPECT_EQ(others, "1: 0 5 5; ");
 }
 
 TEST_F(EccEventsTest, AreKeptApartByBoots) {

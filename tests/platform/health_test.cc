@@ -251,19 +251,12 @@ class Answers final : public DeviceCommands {
 };
 
 // Counts how often each file is put in place, and lets a test interfere.
-class WatchedFiles final : public FileSystem {
+class WatchedFiles final : public MeddlingFiles {
  public:
   std::map<std::string, int> written;
-  std::function<void()> beforeLock;  // called once, before the remembered counters are locked
-  int refusals = 0;                  // of remembered counters to come, while the flash is full
+  int refusals = 0;  // of remembered counters to come, while the flash is full
 
  private:
-  int openFile(const char* path, int flags, mode_t mode) override {
-    if (std::string_view(path).ends_with("/health/.lock")) {
-      if (const auto now = std::exchange(beforeLock, nullptr)) now();
-    }
-    return FileSystem::openFile(path, flags, mode);
-  }
   int renameFile(const char* from, const char* to) override {
     ++written[to];
     errno = ENOSPC;
@@ -437,7 +430,8 @@ TEST_F(HealthReaderTest, NoEarlierFiguresReplaceThoseOfAnotherRun) {
     write(counter, "1000000\n");
     ASSERT_TRUE(readAll(1000));
     run(2000);
-    files.beforeLock = [&] {
+    files.part = "/health/.lock";
+    files.meddle = [&] {
       write(counter, "1000001\n");
       EXPECT_TRUE(readAll(other));
     };
@@ -452,7 +446,8 @@ TEST_F(HealthReaderTest, NoEarlierFiguresReplaceThoseOfAnotherRun) {
 TEST_F(HealthReaderTest, ADriveIsLockedUntilItsReadingIsStored) {
   startWith({"nvme0"});
   put(*answers.smart, 48, {3});
-  files.beforeLock = [this] {
+  files.part = "/health/.lock";
+  files.meddle = [this] {
     put(*answers.smart, 48, {4});
     EXPECT_FALSE(readAll(3000)) << "nvme0 is being read";
   };

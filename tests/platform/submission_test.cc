@@ -284,30 +284,25 @@ TEST_F(Submission, DeletesWhatWaitsOnceThePermissionIsSurelyGone) {
 
   // Preferences that change after the first look count as they are under the lock. When they are
   // damaged or lose the switch, they may have held a permission.
-  struct Meddling : FileSystem {
-    int openFile(const char* path, int flags, mode_t mode) override {
-      if (std::string_view(path).ends_with("Submission/.lock")) beforeLock();
-      return FileSystem::openFile(path, flags, mode);
-    }
-    std::function<void()> beforeLock;
-  } meddling;
+  MeddlingFiles meddling;
+  meddling.part = "Submission/.lock";
   const std::string first = "<key>DiagnosticSubmissionFirstDay</key><integer>1</integer>";
   const std::string text = "<key>DiagnosticSubmissionEnabled</key><string>yes</string>";
   for (const std::string& content :
        {std::string("damaged"), "<plist version=\"1.0\"><dict>" + first + "</dict></plist>",
         "<plist version=\"1.0\"><dict>" + first + text + "</dict></plist>"}) {
     permit(*this, false);
-    meddling.beforeLock = [&] { write(kPermission, content); };
+    meddling.meddle = [&] { write(kPermission, content); };
     EXPECT_FALSE(Service(root, &meddling).submission.isDiagnosticSubmissionEnabled());
     ask();
     EXPECT_EQ(contentOf(root.path(kPermission)), content);
     EXPECT_EQ(files(), before);
   }
   permit(*this, false);
-  meddling.beforeLock = [&] { permit(*this, true); };
+  meddling.meddle = [&] { permit(*this, true); };
   EXPECT_FALSE(Service(root, &meddling).submission.isDiagnosticSubmissionEnabled());
   EXPECT_EQ(files(), before);
-  meddling.beforeLock = [&] { permit(*this, false); };
+  meddling.meddle = [&] { permit(*this, false); };
   write(kFolder + "pending/c.log", "x");
   Service(root, &meddling).submission.submitDiagnosticLogs();
   EXPECT_TRUE(fs::remove(root.path(kFolder + "pending/c.log"))) << "it is no longer permitted";

@@ -301,19 +301,13 @@ TEST(Upload, JudgesEachLogByItsDay) {
   }
 }
 
-// Calls `reach` before one file is opened. That file cannot be removed.
-struct WatchedFiles final : FileSystem {
-  int openFile(const char* path, int flags, mode_t mode) override {
-    if (path == watched) reach();
-    return FileSystem::openFile(path, flags, mode);
-  }
+// The file cannot be removed.
+struct WatchedFiles final : MeddlingFiles {
   int removeFile(const char* path) override {
-    if (path != watched) return FileSystem::removeFile(path);
+    if (path != part) return FileSystem::removeFile(path);
     errno = EIO;
     return -1;
   }
-  std::string watched;
-  std::function<void()> reach;
 };
 
 TEST(Upload, SendsWhatThePermissionIsAskedFor) {
@@ -321,8 +315,8 @@ TEST(Upload, SendsWhatThePermissionIsAskedFor) {
   device.permit("<true/>", "<integer>20784</integer>");
   device.write(kOutbox + nameOf(1) + ".log", kOfTheDayBefore);
   WatchedFiles files;
-  files.watched = device.root.path(kOutbox + nameOf(1) + ".log");
-  files.reach = [&] { device.add(nameOf(1)); };
+  files.part = device.root.path(kOutbox + nameOf(1) + ".log");
+  files.meddle = [&] { device.add(nameOf(1)); };
   int requests = 0;
   ScriptedServer server([&](const std::string&) {
     ++requests;
@@ -347,8 +341,8 @@ TEST(Upload, MakesNoAttemptWhenPackingTakesTheTimeOfARun) {
     device.add(nameOf(1));
     device.add(nameOf(2));
     WatchedFiles files;
-    files.watched = device.root.path(kOutbox + nameOf(number) + ".metadata.plist");
-    files.reach = [&] { device.configuration.run = std::chrono::seconds(0); };
+    files.part = device.root.path(kOutbox + nameOf(number) + ".metadata.plist");
+    files.meddle = [&] { device.configuration.run = std::chrono::seconds(0); };
     EXPECT_EQ(
         device.runAgainst(ScriptedServer([](const std::string&) { return kOk; }), false, &files),
         Outcome::Waits);
@@ -385,11 +379,11 @@ TEST(Upload, EndsWithOneLineWhenALogCannotBeRemoved) {
   device.add(nameOf(1));
   device.add(nameOf(2));
   WatchedFiles files;
-  files.watched = device.root.path(kOutbox + nameOf(1) + ".log");
+  files.part = device.root.path(kOutbox + nameOf(1) + ".log");
   EXPECT_EQ(
       device.runAgainst(ScriptedServer([](const std::string&) { return kOk; }), false, &files),
       Outcome::Failed);
-  const std::string line = "cannot remove " + files.watched + ": Input/output error";
+  const std::string line = "cannot remove " + files.part + ": Input/output error";
   ASSERT_EQ(device.log.lines.size(), 1U);
   EXPECT_TRUE(device.log.lines[0].starts_with(line + "; next attempt after 2026-11-27T18:"));
   EXPECT_EQ(device.state().failure, line);
