@@ -54,17 +54,12 @@ TEST_F(FoldTest, UsersRecordTheirKeysAlone) {
       {recorders, 0644, 15, {"x"}, 3},
       {recorders, 0664, 15, {"com.a.b.x", "com.a.x", "com.b", "x", "y"}, 2},
       {"<plist", 0644, 15, {"com.a.b.x", "com.a.x", "com.b", "x", "y"}, 2},
-      {"", 0644, 15, {"com.a.b.x", "com.a.x", "com.b", "x", "y"}, 2},  // a dangling link
   };
   for (const auto& [content, mode, user, allowed, lines] : cases) {
     SCOPED_TRACE(user);
     std::filesystem::remove(file);
-    if (content.empty()) {
-      std::filesystem::create_symlink("nowhere", file);
-    } else {
-      std::ofstream(file) << content;
-      chmod(file.c_str(), mode);
-    }
+    std::ofstream(file) << content;
+    chmod(file.c_str(), mode);
     std::filesystem::remove_all(root / "var");
     std::filesystem::remove(root / "run/tavrel/fold.lock");
     run([&, uid = user] {
@@ -77,11 +72,6 @@ TEST_F(FoldTest, UsersRecordTheirKeysAlone) {
     const std::size_t refused = keys.size() - allowed.size();
     EXPECT_EQ(foldNow().refused, 2 * refused);
     EXPECT_EQ(log.lines.size(), lines) << testing::PrintToString(log.lines);
-    if (content.empty()) {
-      EXPECT_EQ(log.lines.at(0), file.string() +
-                                     " is ignored: it is a link that leads nowhere; "
-                                     "repair or remove it");
-    }
     look();
     EXPECT_EQ(figure("refused"), 2 * refused);
     Lines taken;
@@ -137,19 +127,28 @@ TEST_F(FoldTest, UsersRecordTheirKeysAlone) {
                 "than root recorded waits for the next fold");
   EXPECT_EQ(log.lines, Lines{file.string() + ": cannot look up the user \"proxy\": Too many "
                                              "open files in system"});
-  // Nor is anything refused while the file cannot be read.
+  // Nor is anything refused while the file cannot be read or its links lead nowhere.
   lookUpResult = 0;
-  std::filesystem::rename(file, root / "list");
-  for (const bool isLoop : {true, false}) {
-    if (isLoop) {
-      std::filesystem::create_symlink(file.filename(), file);
-    } else {
-      std::filesystem::create_directory(file);
-    }
+  std::filesystem::rename(root / "etc/tavrel", root / "etc/away");
+  const auto expectWaiting = [&](const std::filesystem::path& made, const std::string& line) {
     EXPECT_EQ(foldNow().failure, unknown.failure);
-    std::filesystem::remove(file);
+    EXPECT_NE(log.lines.at(0).find(line), std::string::npos) << log.lines.at(0);
+    std::filesystem::remove_all(made);
+  };
+  std::filesystem::create_symlink("nowhere", root / "etc/tavrel");
+  expectWaiting(root / "etc/tavrel",
+                ": its folder is a link that leads nowhere, or a file; repair");
+  for (const std::string target : {"recorders.plist", "nowhere", ""}) {
+    std::filesystem::create_directory(root / "etc/tavrel");
+    if (target.empty()) {
+      std::filesystem::create_directory(file);
+    } else {
+      std::filesystem::create_symlink(target, file);
+    }
+    expectWaiting(root / "etc/tavrel",
+                  target == "nowhere" ? ": it is a link that leads nowhere; repair" : "cannot ");
   }
-  std::filesystem::rename(root / "list", file);
+  std::filesystem::rename(root / "etc/away", root / "etc/tavrel");
   lookUpResult = ENOENT;
   const FoldReport refusing = foldNow();
   lookUpResult = 0;

@@ -27,6 +27,16 @@ plist::Dictionary dictionaryIn(std::string_view bytes, PropertyListCoding& prope
   return {};
 }
 
+std::string reasonToMiss(const std::string& path) {
+  struct stat link {};
+  const std::string folder = path.substr(0, path.rfind('/'));
+  const auto found = FileSystem::status(folder);
+  if (lstat(folder.c_str(), &link) == 0 && !(found && S_ISDIR(found->st_mode))) {
+    return "its folder is a link that leads nowhere, or a file";
+  }
+  return lstat(path.c_str(), &link) == 0 ? "it is a link that leads nowhere" : "";
+}
+
 std::string reasonToDistrust(const std::string& path) {
   const auto status = FileSystem::status(path);
   return status ? reasonToDistrust(*status) : "its owner is unknown: " + systemText(errno);

@@ -22,6 +22,10 @@ plist::Dictionary readDictionaryFile(FileSystem& files, PropertyListCoding& prop
 plist::Dictionary dictionaryIn(std::string_view bytes, PropertyListCoding& propertyLists,
                                SystemLog& log, const std::string& path);
 
+/// Why a file of settings that is not found may exist all the same: it or its folder is a link that
+/// leads nowhere, as to a file system that is not mounted. Empty when it is surely absent.
+std::string reasonToMiss(const std::string& path);
+
 /// Why a file of settings that decide about other users' data cannot be trusted: users other than
 /// root and this process's may write it, or its owner is unknown. Empty when it can be trusted.
 std::string reasonToDistrust(const std::string& path);

@@ -57,13 +57,12 @@ Recorders Recorders::read(const DeviceRoot& root, FileSystem& files,
   const std::string path = root.path(kRecordersFile);
   const auto status = FileSystem::status(path);
   const int code = errno;
-  const bool isAbsent = !status && (code == ENOENT || code == ENOTDIR);
-  struct stat link {};
-  if (isAbsent && lstat(path.c_str(), &link) == 0) {
-    log.log(LogLevel::Error, "%s is ignored: it is a link that leads nowhere; repair or remove it",
-            path);
+  if (!status && (code == ENOENT || code == ENOTDIR)) {
+    const std::string missing = reasonToMiss(path);
+    recorders.areRightsKnown_ = missing.empty();
+    if (!missing.empty()) log.log(LogLevel::Error, "%s: %s; repair or remove it", path, missing);
+    return recorders;
   }
-  if (isAbsent) return recorders;
   const std::string reason = status ? reasonToDistrust(*status) : std::string();
   if (!reason.empty()) {
     log.log(LogLevel::Error, "%s is ignored: %s", path, reason);

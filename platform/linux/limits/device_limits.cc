@@ -65,13 +65,7 @@ Expected<DeviceLimits> DeviceLimits::read(const DeviceRoot& root, FileSystem& fi
   const auto bytes = files.readIfPresent(path, limits::kSystemFactBytes);
   if (!bytes) return Error{bytes.error().message + ": nothing is removed"};
   if (!*bytes) {
-    struct stat link {};
-    const std::string folder = path.substr(0, path.rfind('/'));
-    const auto found = FileSystem::status(folder);
-    if (lstat(folder.c_str(), &link) == 0 && !(found && S_ISDIR(found->st_mode))) {
-      return refuse("its folder is a link that leads nowhere, or a file");
-    }
-    if (lstat(path.c_str(), &link) == 0) return refuse("it is a link that leads nowhere");
+    if (const auto reason = reasonToMiss(path); !reason.empty()) return refuse(reason);
     return limits;
   }
   if (const auto reason = reasonToDistrust(path); !reason.empty()) return refuse(reason);
