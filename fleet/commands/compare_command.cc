@@ -47,9 +47,9 @@ std::string leftOutText(const CompareAnswer& answer) {
   const auto add = [&](std::size_t count, const std::string& why) {
     if (count != 0) text += "  " + counted(count, "statistic") + " " + why + "\n";
   };
-  add(answer.missing, "without logs of both versions on these days");
-  add(answer.tooFew, "of fewer than " + std::to_string(answer.devicesAtLeast) +
-                         " devices, or close to a set that was shown");
+  add(answer.leftOut, "that not both versions have in logs of at least " +
+                          std::to_string(answer.devicesAtLeast) +
+                          " devices, or close to a set that was shown");
   add(answer.unfit, "whose mean or deviation a double cannot hold in one version");
   return text.empty() ? text : "Left out:\n" + text;
 }
@@ -135,10 +135,7 @@ Json compareJson(const CompareAnswer& answer) {
           {"devices_at_least", answer.devicesAtLeast},
           {"confidence", kConfidenceLevel},
           {"comparisons", std::move(list)},
-          {"left_out",
-           {{"not_in_both", answer.missing},
-            {"too_few_devices", answer.tooFew},
-            {"no_mean", answer.unfit}}}};
+          {"left_out", {{"not_in_both", answer.leftOut}, {"no_mean", answer.unfit}}}};
 }
 
 void printCsv(std::ostream& out, const CompareAnswer& answer) {

@@ -148,7 +148,7 @@ void writeLeftOut(page::HtmlWriter& html, const CompareAnswer& comparison) {
               withoutMeanText(logsWithoutMean(one), comparison.devicesAtLeast) + ".");
     html.end();
   }
-  const std::size_t leftOut = comparison.missing + comparison.tooFew + comparison.unfit;
+  const std::size_t leftOut = comparison.leftOut + comparison.unfit;
   if (leftOut != 0) {
     html.element("p",
                  "Left out: " + counted(leftOut, "statistic") +

@@ -56,7 +56,12 @@ std::string intervalText(const Interval& interval, const Text& text) {
 }
 
 std::string percentileText(const ShownSet& set, std::size_t index, std::string_view unit) {
-  if (set.scalar) return cellText(static_cast<double>(set.scalar->percentiles[index]), unit);
+  if (set.scalar) {
+    // The lowest and the highest value, which are those of single devices, stay out.
+    const std::size_t rank = (kPercents[index] * set.logs + 99) / 100;
+    if (rank <= 1 || rank >= set.logs) return "not shown";
+    return cellText(static_cast<double>(set.scalar->percentiles[index]), unit);
+  }
   if (index >= set.histogram.percentiles.size()) return "";
   const Interval& interval = set.histogram.percentiles[index];
   const auto shortText = [unit](double end) { return cellText(end, unit); };

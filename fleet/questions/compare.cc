@@ -106,7 +106,7 @@ struct SideResult {
 };
 struct KeyResult {
   std::array<SideResult, 2> sides;
-  double difference;  // of the means: after - before
+  double difference;  // of the means: after - before; 0 when one is not measured
 };
 
 std::optional<Measured> measure(const Sample& sample, const LogSet& logSet,
@@ -211,12 +211,8 @@ class Comparer {
 
   /// Goes by the order of the keys, whatever order the threads read them in.
   CompareAnswer answer(Ledger& ledger, const CompareRequest& request) {
-    CompareAnswer answer{request, ledger.devicesAtLeast(), {}, 0, 0, 0};
+    CompareAnswer answer{request, ledger.devicesAtLeast(), {}, 0, 0};
     for (std::size_t i = 0; i < keys_.size(); ++i) {
-      if (!results_[i]) {
-        ++answer.missing;
-        continue;
-      }
       const auto& [before, after] = results_[i]->sides;
       const std::string subject = subjectOf(keys_[i].kind, keys_[i].name);
       const std::string means = subjectOfMeans(keys_[i].kind, keys_[i].name);
@@ -225,7 +221,10 @@ class Comparer {
                (side.withMean->empty() || ledger.allows(means, *side.withMean));
       };
       if (!isAllowed(before) || !isAllowed(after)) {
-        ++answer.tooFew;
+        const auto hasEnough = [&](const SideResult& side) {
+          return side.logs->devices(ledger.table()) >= ledger.devicesAtLeast();
+        };
+        if (hasEnough(before) || hasEnough(after)) ++answer.leftOut;
         continue;
       }
       if (!before.measured || !after.measured) {
@@ -264,10 +263,10 @@ class Comparer {
       });
     }
     const auto& [before, after] = samples;
-    if (before.isEmpty || after.isEmpty) return nullptr;
-    return std::make_unique<KeyResult>(
-        KeyResult{{resultOf(before), resultOf(after)},
-                  ExactMoments::differenceOfMeans(before.moments, after.moments)});
+    auto result = std::make_unique<KeyResult>(KeyResult{{resultOf(before), resultOf(after)}, 0});
+    if (result->sides[0].measured && result->sides[1].measured)
+      result->difference = ExactMoments::differenceOfMeans(before.moments, after.moments);
+    return result;
   }
 
   SideResult resultOf(const Sample& sample) {

@@ -56,9 +56,10 @@ struct CompareAnswer {
   std::size_t devicesAtLeast = 0;
   /// The keys that differ come first; within each part, the strongest come first.
   std::vector<Comparison> comparisons;
-  std::size_t missing = 0;  // keys that at most one version has
-  std::size_t tooFew = 0;   // keys for which one version has too few devices
-  std::size_t unfit = 0;    // keys for which one version has no mean or no measurable deviation
+  /// Keys that one version has in logs of enough devices, but not both, or that are too close to
+  /// what was shown. Keys of fewer devices are not even counted.
+  std::size_t leftOut = 0;
+  std::size_t unfit = 0;  // keys for which one version has no mean or no measurable deviation
 };
 
 /// Reads the keys one by one, in two threads. Throws EngineError.

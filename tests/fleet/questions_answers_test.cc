@@ -509,8 +509,7 @@ TEST(CompareTest, FindsWhatChangedAndOnlyThat) {
     if (one.isSignificant()) found.push_back(one.key.name);
   EXPECT_THAT(found, ElementsAre("constant", "key8", "key7"));
   EXPECT_EQ(answer.comparisons.size(), 43u);
-  EXPECT_EQ(answer.missing, 2u);
-  EXPECT_EQ(answer.tooFew, 1u);
+  EXPECT_EQ(answer.leftOut, 2u) << "not those of fewer than ten devices";
   EXPECT_EQ(answer.unfit, 3u);
   EXPECT_EQ(answer.comparisons[1].after.logsWithoutMean, 3u);  // key8 of one device
   EXPECT_EQ(answer.comparisons[1].after.logs, 297u);
