@@ -526,11 +526,18 @@ TEST_F(HealthReaderTest, KeepsReadingsAndGrowthThroughFailures) {
 
   write("/sys/class/mtd", "no folder");
   EXPECT_FALSE(readAll(3000));
+  const std::string vendor = root.path("/sys/block/sda/device/vendor");
+  write("/sys/block/sda/device/model", "DISK");
+  std::filesystem::create_symlink(vendor, vendor);
+  EXPECT_FALSE(readAll(3000));
+  std::filesystem::remove(vendor);
   EXPECT_EQ(readings()["nvme0"].time, 2000);
   EXPECT_EQ(log.lines, (Lines{"readings have no growth: cannot use " + state +
                                   ": it is a folder; move it away",
                               "cannot look for drives: cannot list " + root.path("/sys/class/mtd") +
-                                  ": Not a directory"}));
+                                  ": Not a directory",
+                              "cannot look for drives: cannot read " + vendor +
+                                  ": Too many levels of symbolic links"}));
   std::filesystem::remove(root.path("/sys/class/mtd"));
   ASSERT_TRUE(readAll(4000));
   EXPECT_EQ(grown("nvme0"), 512'000);

@@ -51,7 +51,10 @@ Status addEmmc(const Machine& machine, std::vector<Drive>& drives) {
   for (const std::string& name : *names) {
     const std::string block = machine.sys + "/block/" + name;
     const std::string folder = block + "/device";
-    if (!isNumbered(name, "mmcblk") || readLabel(folder + "/type") != "MMC") continue;
+    if (!isNumbered(name, "mmcblk")) continue;
+    const auto type = readKind(folder + "/type");
+    if (!type) return type.error();
+    if (*type != "MMC") continue;
     drives.push_back({name, DriveKind::Emmc, folder, machine.dev + '/' + name,
                       readLabel(folder + "/name"), readLabel(folder + "/fwrev"),
                       readLabel(folder + "/serial"), bytesOfSectors(readNumber(block + "/size"))});
@@ -81,7 +84,9 @@ Status addScsi(const Machine& machine, std::vector<Drive>& drives) {
     const std::string model = readLabel(device + "/model");
     const std::string firmware = readLabel(device + "/rev");
     const auto capacity = bytesOfSectors(readNumber(block + "/size"));
-    if (readLabel(device + "/vendor") == "ATA") {
+    const auto vendor = readKind(device + "/vendor");
+    if (!vendor) return vendor.error();
+    if (*vendor == "ATA") {
       // The identity page has a header of four bytes before the serial number.
       const std::string page = readLabel(device + "/vpd_pg80");
       const std::string serial = page.size() > 4 ? page.substr(4) : std::string();

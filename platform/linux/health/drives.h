@@ -31,7 +31,8 @@ struct Drive {
   std::optional<std::int64_t> capacity;  // bytes
 };
 
-/// By kind and number. An error when a folder of sysfs cannot be listed.
+/// By kind and number. An error when a folder of sysfs cannot be listed, or when the attribute that
+/// says what a drive is cannot be read.
 Expected<std::vector<Drive>> findDrives(const Machine& machine);
 
 }  // namespace tavrel::health

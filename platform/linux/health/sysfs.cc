@@ -11,25 +11,36 @@
 #include "base/parse_number.h"
 #include "platform/linux/files/descriptor.h"
 #include "platform/linux/files/file_system.h"
+#include "platform/linux/files/system_error.h"
 
 namespace tavrel::health {
 namespace {
 
 constexpr std::size_t kLabelBytes = 64;
 
+// Empty for an attribute that is missing, or whose device has gone.
+Expected<std::string> textOf(const std::string& path) {
+  const auto failed = [&]() -> Expected<std::string> {
+    const bool isGone = errno == ENOENT || errno == ENOTDIR || errno == ENODEV || errno == ENXIO;
+    if (isGone) return std::string();
+    return systemError("read", path);
+  };
+  const Descriptor file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
+  struct stat status {};
+  if (!file || fstat(file.get(), &status) != 0) return failed();
+  if (!S_ISREG(status.st_mode)) return std::string();
+  std::array<char, 4096> buffer{};
+  const ssize_t size = read(file.get(), buffer.data(), buffer.size());
+  if (size < 0) return failed();
+  return std::string(trimmed(std::string_view(buffer.data(), static_cast<std::size_t>(size))));
+}
+
 }  // namespace
 
 std::optional<std::string> readAttribute(const std::string& path) {
-  const Descriptor file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
-  struct stat status {};
-  if (!file || fstat(file.get(), &status) != 0 || !S_ISREG(status.st_mode)) return std::nullopt;
-  std::array<char, 4096> buffer{};
-  const ssize_t size = read(file.get(), buffer.data(), buffer.size());
-  if (size <= 0) return std::nullopt;
-  const std::string_view text =
-      trimmed(std::string_view(buffer.data(), static_cast<std::size_t>(size)));
-  if (text.empty()) return std::nullopt;
-  return std::string(text);
+  auto text = textOf(path);
+  if (!text || text->empty()) return std::nullopt;
+  return *std::move(text);
 }
 
 std::optional<std::int64_t> decimalOf(std::string_view text) {
@@ -43,10 +54,16 @@ std::optional<std::int64_t> readNumber(const std::string& path) {
 }
 
 std::string readLabel(const std::string& path) {
-  std::string label = readAttribute(path).value_or("");
-  label.resize(std::min(label.size(), kLabelBytes));
+  auto label = readKind(path);
+  return label ? *std::move(label) : std::string();
+}
+
+Expected<std::string> readKind(const std::string& path) {
+  auto label = textOf(path);
+  if (!label) return label;
+  label->resize(std::min(label->size(), kLabelBytes));
   std::ranges::replace_if(
-      label, [](char c) { return c < ' ' || c > '~'; }, '?');
+      *label, [](char c) { return c < ' ' || c > '~'; }, '?');
   return label;
 }
 

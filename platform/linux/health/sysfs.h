@@ -22,6 +22,10 @@ std::optional<std::int64_t> readNumber(const std::string& path);
 /// An attribute as text for people and file formats: printable ASCII, at most 64 characters.
 std::string readLabel(const std::string& path);
 
+/// The same for an attribute that says whether a device is one of ours: an error when it cannot be
+/// read although it is there, so that its device does not count as absent.
+Expected<std::string> readKind(const std::string& path);
+
 /// Names in a folder, in numeric order ("nvme2" before "nvme10"); none for a missing folder.
 Expected<std::vector<std::string>> namesIn(const std::string& folder);
 
