@@ -253,6 +253,14 @@ int ftruncate64(int file, off64_t length) {
   REAL(ftruncate64)
   return fails(kTruncate, ENOSPC) ? -1 : real(file, length);
 }
+int fallocate(int file, int mode, off_t offset, off_t length) {
+  REAL(fallocate)
+  return fails(kTruncate, ENOSPC) ? -1 : real(file, mode, offset, length);
+}
+int fallocate64(int file, int mode, off64_t offset, off64_t length) {
+  REAL(fallocate64)
+  return fails(kTruncate, ENOSPC) ? -1 : real(file, mode, offset, length);
+}
 
 int unlink(const char* path) {
   REAL(unlink)
@@ -333,7 +341,6 @@ long syscall(long number, ...) {
   va_end(arguments);
   if (number == SYS_openat && fails(kOpen, EMFILE)) return -1;
   if (number == SYS_read && fails(kRead, EIO)) return -1;
-  if (number == SYS_fallocate && fails(kTruncate, ENOSPC)) return -1;
   REAL(syscall)
   return real(number, values[0], values[1], values[2], values[3], values[4], values[5]);
 }
