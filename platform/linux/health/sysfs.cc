@@ -2,9 +2,9 @@
 
 #include <algorithm>
 #include <array>
+#include <climits>
 #include <cstdlib>
 #include <fcntl.h>
-#include <memory>
 #include <sys/stat.h>
 
 #include "base/ascii.h"
@@ -80,9 +80,9 @@ bool isNumbered(std::string_view name, std::string_view prefix) {
 }
 
 std::string resolved(const std::string& path) {
-  const std::unique_ptr<char, decltype(&std::free)> real(realpath(path.c_str(), nullptr),
-                                                         &std::free);
-  return real ? std::string(real.get()) : std::string();
+  // If realpath allocated the room, a lack of memory would look like a missing file.
+  std::array<char, PATH_MAX> real{};
+  return realpath(path.c_str(), real.data()) != nullptr ? std::string(real.data()) : std::string();
 }
 
 bool isAsleep(const std::string& path) {
