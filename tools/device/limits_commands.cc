@@ -77,16 +77,25 @@ std::string removalText(const TidiedKind& tidied) {
   return tidied.days.empty() ? text : text + ", " + daysText(tidied.days);
 }
 
-void tidy(ToolContext& context, bool isQuiet) {
-  const TidyReport report = tidyOf(context, context.linuxPlatform().store()).run();
+Json jsonOfRemovals(const TidyReport& report) {
   Json removals = Json::array();
   for (const TidiedKind& tidied : report.kinds) {
+    if (tidied.removed == 0) continue;
+    Json days = Json::array();
+    for (const std::int32_t day : tidied.days)
+      days.push_back(day);
+    removals.push_back(
+        {{"name", tidied.kind->name}, {"removed", tidied.removed}, {"days", std::move(days)}});
+  }
+  return removals;
+}
+
+void tidy(ToolContext& context, bool isQuiet) {
+  const TidyReport report = tidyOf(context, context.linuxPlatform().store()).run();
+  bool hasRemoved = false;
+  for (const TidiedKind& tidied : report.kinds) {
     if (tidied.removed > 0) {
-      Json days = Json::array();
-      for (const std::int32_t day : tidied.days)
-        days.push_back(day);
-      removals.push_back(
-          {{"name", tidied.kind->name}, {"removed", tidied.removed}, {"days", std::move(days)}});
+      hasRemoved = true;
       if (!context.json()) context.out() << removalText(tidied) << '\n';
     }
     if (tidied.exceeds) {
@@ -97,8 +106,8 @@ void tidy(ToolContext& context, bool isQuiet) {
     }
   }
   if (context.json()) {
-    context.printJson({{"removals", removals}});
-  } else if (removals.empty() && report.failures.empty() && !isQuiet) {
+    context.printJson({{"removals", jsonOfRemovals(report)}});
+  } else if (!hasRemoved && report.failures.empty() && !isQuiet) {
     context.out() << "nothing to remove\n";
   }
   for (const std::string& failure : report.failures)
