@@ -316,6 +316,14 @@ int poll(struct pollfd* files, nfds_t count, int timeout) {
   REAL(poll)
   return waited(real(files, count, shortened(timeout)), timeout);
 }
+int nanosleep(const struct timespec* pause, struct timespec* left) {
+  REAL(nanosleep)
+  const long asked = pause->tv_sec * 1000 + pause->tv_nsec / 1000000;
+  if (!skipsWaits || asked <= kLongestWait) return real(pause, left);
+  const struct timespec shorter = {.tv_nsec = kLongestWait * 1000000L};
+  atomic_fetch_add(&skipped, asked - kLongestWait);
+  return real(&shorter, left);
+}
 int clock_gettime(clockid_t clock, struct timespec* now) {
   REAL(clock_gettime)
   const int result = real(clock, now);
