@@ -11,10 +11,13 @@ from programs import Broken, LogServer, run, tool
 
 PENDING = "var/mobile/Library/Logs/Submission/pending"
 MOMENT = re.compile(r"<date>.*Z</date>")
-NOT_IN_THE_LOG = re.compile("Z (error (statistics store|cannot finish the daily log|cannot file log|"
-                            "cannot list|cannot read|Couldn't load whitelist|Failed to write)|"
-                            "default Couldn't allocate histCounts)")
+# The lines that say that a run files no log.
+NOT_FILED = re.compile("Z error (run ended early|cannot (go on serving|finish the (run|daily log)|"
+                       "file log|read .*zentrix.plist: )|statistics store|"
+                       "Couldn't load whitelist)|out of memory|terminate called")
 NEVER_CAME = re.compile("never received requested AAI|out of memory|terminate called")
+# How the machine is asked. What does not answer is left out.
+ASKING = {"allocation", "open", "read", "listing", "thread"}
 SUMS = ["cpu.busy_milliseconds", "disk.read_kib", "disk.written_kib", "network.received_kib",
         "network.sent_kib"]
 # What a log makes of lists, and the lines that say that one is cut short.
@@ -54,17 +57,21 @@ def wanted(look, reference):
 def after_daily(device, reference, done):
     if done.returncode != 0:
         raise Broken(f"the daemon ends with {done.returncode}")
+    filed_itself = bool(logs(device))
     next_daily_run(device, "-d")
     if values(device) != wanted(values, reference):
         raise Broken("statistics differ")
     found, right = logs(device), wanted(logs, reference)[0]
+    # A line is written, too: without it, the next run must have filed the log.
+    is_there = bool(found) if done.kind == "write" else filed_itself
+    if not is_there and not NOT_FILED.search(done.stderr):
+        raise Broken(f"it files no log and does not say why: {done.stderr}")
     # A run that was cut off after it filed its log files it again.
     if 0 < len(found) <= 2 and all(log == right for log in found):
         return
     # What the log lacks is said, nothing in it is wrong, and a forced run files the whole one.
-    said_why = [line for line in done.stderr.splitlines() if NOT_IN_THE_LOG.search(line)]
-    wrong = [key for log in found for key in lacks_or_differs(log, right, said_why)]
-    if not said_why or wrong:
+    wrong = [key for log in found for key in lacks_or_differs(log, right, done.stderr.splitlines())]
+    if wrong or len(found) > 2:
         raise Broken(f"{len(found)} logs, different in {wrong}; the run said: {errors_of(done)}")
     next_daily_run(device, "-f")
     if logs(device).count(right) != found.count(right) + 1:
@@ -82,10 +89,12 @@ def errors_of(done):
     return [line for line in done.stderr.splitlines() if "Z error " in line]
 
 
-def lacks_or_differs(log, right, said_why):
-    """The entries of a log that nobody said would be missing, or that are wrong."""
-    named = [match[1] or match[2] for line in said_why if (match := NAMED.search(line))]
-    excused = LISTED if any(NOT_LISTED.search(line) for line in said_why) else set()
+def lacks_or_differs(log, right, lines):
+    """The entries of a log that no line said would be missing, or that are wrong."""
+    named = [match[1] or match[2] for line in lines if (match := NAMED.search(line))]
+    excused = LISTED if any(NOT_LISTED.search(line) for line in lines) else set()
+    # Where the store could not be read, no line names what it has.
+    may_lack_any = not named and any("Z error statistics store " in line for line in lines)
     for group in sorted({*log, *right}):
         ours, theirs = log.get(group), right.get(group)
         if not isinstance(theirs, dict):
@@ -94,16 +103,27 @@ def lacks_or_differs(log, right, said_why):
             continue
         for key in sorted({*(ours or {}), *theirs} - excused):
             is_absent = key not in (ours or {})
-            if not (is_absent and (not named or key in named)) and (
-                    is_absent or ours[key] != theirs.get(key)):
+            if not (may_lack_any or key in named) if is_absent else ours[key] != theirs.get(key):
                 yield key
 
 
 def after_fold(device, reference, done):
+    # Segments that it emptied may stay without a word: the next fold removes them.
+    if done.returncode == 0 and folded(device) != wanted(folded, reference):
+        raise Broken(f"it ends with 0, and the store has {folded(device)}")
     tool(device, "stat", "fold")
     if values(device) != wanted(values, reference):
         raise Broken("statistics differ")
     said(done)
+
+
+def folded(root):
+    """The statistics of the store, without what waits."""
+    waiting, aside = root / "run/tavrel/stat", root / "aside"
+    waiting.rename(aside)
+    found = values(root)
+    aside.rename(waiting)
+    return found
 
 
 def after_add(device, _, done):
@@ -115,23 +135,38 @@ def after_add(device, _, done):
     said(done)
 
 
-def after_again(*command):
+def after_again(*command, look=None):
+    """`look` shows the logs that must be there when the program ends with 0, if not all files."""
     def check(device, reference, done):
         said(done)
+        if done.returncode == 0:
+            is_done(device, reference, done, look or filed)
         tool(device, *command)
-        if values(device) != wanted(values, reference):
-            raise Broken(f"statistics differ: {values(device)}; the program said: {done.stderr}")
-        if is_allowed(device) != wanted(is_allowed, reference):
-            raise Broken("the permission differs")
-        if filed(device) != wanted(filed, reference):
-            raise Broken(f"there are the logs {sorted(filed(device))}")
+        is_done(device, reference, done, filed)
     return check
+
+
+def is_done(device, reference, done, look):
+    ended = f"; it ended with {done.returncode}: {done.stderr}"
+    if values(device) != wanted(values, reference):
+        raise Broken(f"statistics differ: {values(device)}{ended}")
+    if is_allowed(device) != wanted(is_allowed, reference):
+        raise Broken(f"the permission differs{ended}")
+    if look(device) != wanted(look, reference):
+        raise Broken(f"there are the logs {sorted(look(device))}{ended}")
 
 
 def filed(root):
     """All that is kept for submission, by name."""
     folder = (root / PENDING).parent
     return {path.name: path.read_bytes() for path in folder.rglob("log-*")}
+
+
+def with_their_logs(root):
+    """The same without metadata of logs that have gone, which a later tidy removes."""
+    files = filed(root)
+    return {name: content for name, content in files.items()
+            if name.replace(".metadata.plist", ".log") in files}
 
 
 def after_change(look):
@@ -182,6 +217,11 @@ def after_health(device, reference, done):
              for key, value in reading.items() if key[0] and value != right[drive].get(key)]
     if wrong:
         raise Broken(f"a reading has {wrong}; it said: {done.stderr}")
+    # A figure that cannot be read is absent without a word, like one that the drive does not
+    # report. But each drive has a new reading.
+    if done.returncode == 0 and (replaced(device, done.before) != set(right)
+                                 or done.kind not in ASKING and readings(device) != right):
+        raise Broken(f"it ends with 0, and readings are {readings(device)} in place of {right}")
     again, _ = run(device, done.args_of)
     now = readings(device)
     if "starting again" in done.stderr:
@@ -205,13 +245,19 @@ def readings(root):
     return found
 
 
+def replaced(root, before):
+    """The names of the readings that are no longer those of before."""
+    folder = "run/tavrel/health"
+    return {path.name for path in (root / folder).glob("*.plist")
+            if path.stat().st_mtime_ns != (before / folder / path.name).stat().st_mtime_ns}
+
+
 def after_collect(device, reference, done):
     """Values are right or absent; the next sample counts nothing twice."""
     said(done)
     now, right = collected(device), wanted(collected, reference)
     before = wanted(collected, done.before)
-    # They are how the machine is asked.
-    is_whole = done.kind not in ("allocation", "open", "read", "listing", "thread")
+    is_whole = done.kind not in ASKING
     wrong = {key: value for key, value in now.items() if value not in (right[key], before.get(key))}
     if wrong or done.returncode == 0 and (
             now["samples"] != right["samples"] or is_whole and now != right):
@@ -286,6 +332,9 @@ def after_upload(device, reference, done):
     if {**waiting, **LogServer.kept} != all_logs:
         raise Broken(f"of {sorted(all_logs)} there are {sorted(waiting)} on the device and "
                      f"{sorted(LogServer.kept)} on the server; it said: {done.stderr}")
+    # Nothing may be sent while the permission cannot be read, which is said.
+    if done.returncode == 0 and waiting and "zentrix.plist: " not in done.stderr:
+        raise Broken(f"it ends with 0, and {sorted(waiting)} wait")
     again, _ = run(device, done.args_of)
     if again.returncode or LogServer.kept != all_logs:
         raise Broken(f"the next run ends with {again.returncode}: {again.stderr}")
@@ -293,6 +342,8 @@ def after_upload(device, reference, done):
 
 def after_load(device, reference, done):
     said(done)
+    if done.returncode == 0 and rows(device) != wanted(rows, reference):
+        raise Broken("it ends with 0, and rows differ")
     again, _ = run(device, done.args_of)
     if again.returncode or rows(device) != wanted(rows, reference):
         raise Broken(f"the next load ends with {again.returncode}, and rows may differ: "

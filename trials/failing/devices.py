@@ -66,6 +66,13 @@ def file_logs(root):
         shutil.copy(metadata, root / PENDING / f"{name}.metadata.plist")
 
 
+def exceed_limits(root):
+    """Three logs, of which the limits keep one."""
+    file_logs(root)
+    (root / "etc/tavrel").mkdir(parents=True)
+    (root / "etc/tavrel/limits.plist").write_bytes(plistlib.dumps({"Pending": {"Days": 1}}))
+
+
 def write_statistics(root):
     (root / "statistics").write_text(
         f"scalar\t{YESTERDAY}\tcom.example.import.s\t1\n"
