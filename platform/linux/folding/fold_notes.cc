@@ -1,11 +1,13 @@
 #include "platform/linux/folding/fold_notes.h"
 
+#include <cerrno>
 #include <sys/stat.h>
 #include <unistd.h>
 
 #include "base/bytes.h"
 #include "base/limits.h"
 #include "platform/linux/files/digests.h"
+#include "platform/linux/files/system_error.h"
 
 namespace tavrel {
 namespace {
@@ -26,12 +28,14 @@ constexpr std::size_t kHeaderBytes = 16;
 }  // namespace
 
 Expected<FoldNotes> FoldNotes::lock(const DeviceRoot& root, FileSystem& files, SystemLog& log) {
-  Expected<Descriptor> file = files.lockFile(root.path(kLockPath), kPatience);
+  std::string path = root.path(kLockPath);
+  Expected<Descriptor> file = files.lockFile(path, kPatience);
   if (!file) return file.error();
-  return FoldNotes(*std::move(file), log);
+  return FoldNotes(*std::move(file), std::move(path), log);
 }
 
-FoldNotes::FoldNotes(Descriptor file, SystemLog& log) : file_(std::move(file)), log_(log) {
+FoldNotes::FoldNotes(Descriptor file, std::string path, SystemLog& log)
+    : file_(std::move(file)), path_(std::move(path)), log_(log) {
   std::string content(kHeaderBytes + kRemembered * sizeof(std::uint64_t), '\0');
   const ssize_t size = pread(file_.get(), content.data(), content.size(), 0);
   content.resize(size > 0 ? static_cast<std::size_t>(size) : 0);
@@ -99,9 +103,10 @@ void FoldNotes::save() {
   append(uncountedValues_);
   for (const std::uint64_t digest : logged_)
     append(digest);
-  if (pwrite(file_.get(), content.data(), content.size(), 0) < 0) {
-    log_.log(LogLevel::Error, "cannot write %s: refusals will be logged again", kLockPath);
-  }
+  const ssize_t written = pwrite(file_.get(), content.data(), content.size(), 0);
+  if (written == std::ssize(content)) return;
+  const Error why = systemError("write", path_, written < 0 ? errno : ENOSPC);
+  log_.log(LogLevel::Error, "%s: refusals may be logged and counted again", why.message);
 }
 
 }  // namespace tavrel

@@ -8,6 +8,7 @@
 
 #include <cstdint>
 #include <ctime>
+#include <string>
 #include <string_view>
 #include <unordered_set>
 
@@ -48,9 +49,10 @@ class FoldNotes {
   void save();
 
  private:
-  FoldNotes(Descriptor file, SystemLog& log);
+  FoldNotes(Descriptor file, std::string path, SystemLog& log);
 
   Descriptor file_;
+  std::string path_;  // for messages
   SystemLog& log_;
   std::unordered_set<std::uint64_t> logged_;  // first 8 bytes of the lines' SHA-256
   std::uint64_t uncountedFiles_ = 0;

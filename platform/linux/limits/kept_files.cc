@@ -39,7 +39,7 @@ std::int64_t blocksOf(const struct stat& status) {
   return (size + kBlockBytes - 1) / kBlockBytes * kBlockBytes;
 }
 
-// The names of preferences in use may contain ".corrupt-", too; those set aside end in a stamp.
+// Preferences in use may have the mark in their name, too; only their files end in ".plist".
 bool isSetAside(std::string_view name) {
   return (name.find(kSetAsideMark) != name.npos && !name.ends_with(".plist")) ||
          name.ends_with("-kept-damaged") || name.ends_with(".unusable");
