@@ -2,10 +2,10 @@
 
 #include <array>
 #include <bit>
-#include <cstring>
 #include <optional>
 #include <string>
 
+#include "base/copy_little.h"
 #include "fleet/logs/xml_value.h"
 
 namespace tavrel::fleet {
@@ -27,8 +27,7 @@ constexpr std::size_t kWordBytes = sizeof(std::uint64_t);
 std::size_t plainInWord(const char* text) {
   constexpr std::uint64_t kOnes = 0x0101010101010101;
   std::uint64_t word = 0;
-  std::memcpy(&word, text, sizeof word);
-  if constexpr (std::endian::native == std::endian::big) word = __builtin_bswap64(word);
+  copyLittle(&word, text, sizeof word);
   // Sets the top bit of the first byte, if any, that is less than the number.
   const auto less = [](std::uint64_t bytes, std::uint64_t number) {
     return (bytes - number * kOnes) & ~bytes;

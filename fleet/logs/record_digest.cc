@@ -6,10 +6,11 @@
 
 #include <bit>
 #include <cstdint>
-#include <cstring>
 #include <openssl/sha.h>
 #include <string>
 #include <string_view>
+
+#include "base/copy_little.h"
 
 namespace tavrel::fleet {
 namespace {
@@ -21,9 +22,8 @@ class Form {
   explicit Form(std::size_t room) { bytes_.reserve(room); }
 
   void add(std::uint64_t word) {
-    if constexpr (std::endian::native == std::endian::big) word = __builtin_bswap64(word);
     char raw[sizeof word];
-    std::memcpy(raw, &word, sizeof word);
+    copyLittle(raw, &word, sizeof word);
     bytes_.append(raw, sizeof raw);
   }
   void add(std::int64_t word) { add(static_cast<std::uint64_t>(word)); }

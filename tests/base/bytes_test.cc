@@ -4,6 +4,7 @@
 #include <gtest/gtest.h>
 
 #include "base/arithmetic.h"
+#include "base/copy_little.h"
 
 namespace tavrel {
 namespace {
@@ -22,6 +23,9 @@ TEST(Bytes, LoadsOnlyWhatLiesInside) {
   EXPECT_EQ(slice(bytes, 9, 0)->size(), 0U);
   EXPECT_EQ(asText(*slice(bytes, 0, 2)), "\x01\x02");
   EXPECT_FALSE(slice(bytes, 10, 0) || slice(bytes, 1, kMax64) || slice(bytes, 1, 9));
+  double real = 0;
+  copyLittle(&real, "\0\0\0\0\0\0\xF0\x3F", sizeof real);
+  EXPECT_EQ(real, 1);
 }
 
 TEST(Bytes, StoresWhollyOrNotAtAll) {

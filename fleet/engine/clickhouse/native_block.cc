@@ -1,11 +1,7 @@
 #include "fleet/engine/clickhouse/native_block.h"
 
-#include <bit>
-
 namespace tavrel::fleet {
 namespace {
-
-static_assert(std::endian::native == std::endian::little, "the format is little-endian");
 
 struct TooShort {};
 struct Malformed {};

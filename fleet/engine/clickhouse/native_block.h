@@ -1,15 +1,16 @@
-// ClickHouse's column format: blocks of rows that hold the values column by column. Servers write
-// it in two thirds of the time that the row format takes.
+// ClickHouse's column format: blocks of rows that hold the values column by column, numbers
+// little-endian. Servers write it in two thirds of the time that the row format takes.
 #pragma once
 
 #include <concepts>
 #include <cstddef>
 #include <cstdint>
-#include <cstring>
 #include <functional>
 #include <span>
 #include <string_view>
 #include <vector>
+
+#include "base/copy_little.h"
 
 namespace tavrel::fleet {
 
@@ -59,7 +60,7 @@ class NativeBlock {
  private:
   template <class Value>
   static void take(const char*& next, Value& value) {
-    std::memcpy(&value, next, sizeof value);
+    copyLittle(&value, next, sizeof value);
     next += sizeof value;
   }
   static void take(const char*& next, std::string_view& text);

@@ -1,19 +1,20 @@
-// ClickHouse's row format: numbers as they are in memory, each text preceded by its length.
+// ClickHouse's row format: numbers are little-endian, each text is preceded by its length.
 #pragma once
 
-#include <bit>
 #include <string>
 #include <string_view>
 #include <type_traits>
 
-namespace tavrel::fleet {
+#include "base/copy_little.h"
 
-static_assert(std::endian::native == std::endian::little, "the format is little-endian");
+namespace tavrel::fleet {
 
 template <class Number>
 requires std::is_arithmetic_v<Number>
 void put(std::string& out, Number number) {
-  out.append(reinterpret_cast<const char*>(&number), sizeof number);
+  char bytes[sizeof number];
+  copyLittle(bytes, &number, sizeof number);
+  out.append(bytes, sizeof bytes);
 }
 
 inline void put(std::string& out, std::string_view text) {

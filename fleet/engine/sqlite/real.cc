@@ -1,8 +1,9 @@
 #include "fleet/engine/sqlite/real.h"
 
 #include <cmath>
-#include <cstring>
 #include <sqlite3.h>
+
+#include "base/copy_little.h"
 
 namespace tavrel::fleet {
 
@@ -13,7 +14,7 @@ double realOf(sqlite3_value* value) {
     case SQLITE_BLOB: {
       double real = kUsualNan;
       if (sqlite3_value_bytes(value) == sizeof real)
-        std::memcpy(&real, sqlite3_value_blob(value), sizeof real);
+        copyLittle(&real, sqlite3_value_blob(value), sizeof real);
       return real;
     }
     default:
@@ -23,7 +24,9 @@ double realOf(sqlite3_value* value) {
 
 void setResult(sqlite3_context* result, double value) {
   if (std::isnan(value) && !isUsualNan(value)) {
-    sqlite3_result_blob(result, &value, sizeof value, SQLITE_TRANSIENT);
+    char bytes[sizeof value];
+    copyLittle(bytes, &value, sizeof value);
+    sqlite3_result_blob(result, bytes, sizeof bytes, SQLITE_TRANSIENT);
   } else {
     sqlite3_result_double(result, value);
   }

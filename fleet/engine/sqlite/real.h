@@ -1,8 +1,8 @@
 // Doubles as SQLite values that come back with the same bits.
 //
 // SQLite has no not-a-number: it stores null instead. So null stands for the usual one, which
-// number parsers yield, and any other is a blob of its 8 bytes. Columns of doubles have no declared
-// type, because the conversions of a REAL column lose the sign of zero.
+// number parsers yield, and any other is a blob of its 8 bytes, little-endian. Columns of
+// doubles have no declared type, because the conversions of a REAL column lose the sign of zero.
 #pragma once
 
 #include <bit>
