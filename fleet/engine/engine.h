@@ -25,6 +25,11 @@ class EngineError : public std::runtime_error {
   using std::runtime_error::runtime_error;
 };
 
+enum class OpenMode : std::uint8_t {
+  Read,   // the database must exist
+  Write,  // makes the database or its tables when they are missing
+};
+
 /// Identifies a log within one database; other databases number theirs differently.
 using LogId = std::uint64_t;
 

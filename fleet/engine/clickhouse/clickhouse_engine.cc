@@ -10,8 +10,8 @@ namespace {
 
 class ClickhouseEngine final : public Engine {
  public:
-  ClickhouseEngine(const ServerAddress& address, bool writes) : server_(address) {
-    openTables(server_, writes);
+  ClickhouseEngine(const ServerAddress& address, OpenMode mode) : server_(address) {
+    openTables(server_, mode);
   }
 
   Appended append(std::span<const LogRecord> records) override {
@@ -32,7 +32,7 @@ class ClickhouseEngine final : public Engine {
   }
 
   std::unique_ptr<Engine> reader() override {
-    return std::make_unique<ClickhouseEngine>(server_.address(), false);
+    return std::make_unique<ClickhouseEngine>(server_.address(), OpenMode::Read);
   }
 
  private:
@@ -43,8 +43,8 @@ class ClickhouseEngine final : public Engine {
 
 }  // namespace
 
-std::unique_ptr<Engine> openClickhouseEngine(std::string_view address, bool writes) {
-  return std::make_unique<ClickhouseEngine>(readServerAddress(address), writes);
+std::unique_ptr<Engine> openClickhouseEngine(std::string_view address, OpenMode mode) {
+  return std::make_unique<ClickhouseEngine>(readServerAddress(address), mode);
 }
 
 }  // namespace tavrel::fleet

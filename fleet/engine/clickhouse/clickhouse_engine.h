@@ -8,7 +8,7 @@
 
 namespace tavrel::fleet {
 
-/// address.h has the form of the address. With `writes`, makes missing tables. Throws EngineError.
-std::unique_ptr<Engine> openClickhouseEngine(std::string_view address, bool writes);
+/// address.h has the form of the address. Throws EngineError.
+std::unique_ptr<Engine> openClickhouseEngine(std::string_view address, OpenMode mode);
 
 }  // namespace tavrel::fleet

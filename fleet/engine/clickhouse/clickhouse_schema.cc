@@ -122,7 +122,8 @@ void makeDistributedTables(Server& server, const std::string& database,
 
 }  // namespace
 
-void openTables(Server& server, bool writes) {
+void openTables(Server& server, OpenMode mode) {
+  const bool writes = mode == OpenMode::Write;
   const ServerAddress& address = server.address();
   std::string versions = versionsIn(server, address.database);
   if (versions.empty() && writes) {

@@ -6,7 +6,7 @@
 namespace tavrel::fleet {
 
 /// Selects the database's tables, or those of its cluster, on the server and checks their version.
-/// With `writes`, makes missing tables. Throws EngineError.
-void openTables(Server& server, bool writes);
+/// Makes missing tables when it may write. Throws EngineError.
+void openTables(Server& server, OpenMode mode);
 
 }  // namespace tavrel::fleet

@@ -29,9 +29,8 @@ std::string databaseName(const std::string& where) {
 }
 
 std::unique_ptr<Engine> openEngine(std::string_view where, OpenMode mode) {
-  const bool writes = mode == OpenMode::Write;
-  if (isServerAddress(where)) return openClickhouseEngine(where, writes);
-  return openSqliteEngine(std::string(where), writes);
+  if (isServerAddress(where)) return openClickhouseEngine(where, mode);
+  return openSqliteEngine(std::string(where), mode);
 }
 
 }  // namespace tavrel::fleet

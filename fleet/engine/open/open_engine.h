@@ -1,7 +1,6 @@
 // Opens the database that the command line names.
 #pragma once
 
-#include <cstdint>
 #include <memory>
 #include <string>
 #include <string_view>
@@ -9,11 +8,6 @@
 #include "fleet/engine/engine.h"
 
 namespace tavrel::fleet {
-
-enum class OpenMode : std::uint8_t {
-  Read,   // the database must exist
-  Write,  // makes the database or its tables when they are missing
-};
 
 /// A readable fault in the text that names a database; empty when there is none. Checks only
 /// the text, not the database.

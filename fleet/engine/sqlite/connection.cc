@@ -4,7 +4,6 @@
 #include <sqlite3.h>
 
 #include "base/system_text.h"
-#include "fleet/engine/engine.h"
 #include "fleet/engine/sqlite/real.h"
 
 namespace tavrel::fleet {
@@ -16,7 +15,8 @@ constexpr int kBusyMilliseconds = 60'000;
 constexpr const char* kCopy =
     "copy it to a folder that you may write in, or load a log into it as its owner";
 
-const char* adviceFor(int code, bool writes) {
+const char* adviceFor(int code, OpenMode mode) {
+  const bool writes = mode == OpenMode::Write;
   switch (code & 0xFF) {
     case SQLITE_BUSY:
     case SQLITE_LOCKED:
@@ -50,7 +50,8 @@ void Connection::Close::operator()(sqlite3* handle) const {
   sqlite3_close(handle);
 }
 
-Connection::Connection(const std::string& path, bool writes) : path_(path), writes_(writes) {
+Connection::Connection(const std::string& path, OpenMode mode) : path_(path), mode_(mode) {
+  const bool writes = mode == OpenMode::Write;
   // SQLite gives ":memory:" and "file:..." a meaning of their own.
   const std::string plain = path.starts_with('/') ? path : "./" + path;
   sqlite3* handle = nullptr;
@@ -71,7 +72,7 @@ void Connection::fail(int code) const {
   if (const int system = handle_ ? sqlite3_system_errno(handle()) : 0;
       system != 0 && ((code & 0xFF) == SQLITE_IOERR || (code & 0xFF) == SQLITE_CANTOPEN))
     text += " (" + systemText(system) + ")";
-  throw EngineError(text + ": " + adviceFor(code, writes_));
+  throw EngineError(text + ": " + adviceFor(code, mode_));
 }
 
 void Connection::execute(const char* sql) {

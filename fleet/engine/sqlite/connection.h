@@ -6,6 +6,8 @@
 #include <string>
 #include <string_view>
 
+#include "fleet/engine/engine.h"
+
 struct sqlite3;
 struct sqlite3_stmt;
 
@@ -14,7 +16,7 @@ namespace tavrel::fleet {
 class Connection {
  public:
   /// `path` names a file, whatever it begins with.
-  Connection(const std::string& path, bool writes);
+  Connection(const std::string& path, OpenMode mode);
 
   void execute(const char* sql);
   /// The first column of the first row.
@@ -33,7 +35,7 @@ class Connection {
   };
 
   std::string path_;
-  bool writes_;
+  OpenMode mode_;
   std::unique_ptr<sqlite3, Close> handle_;
 };
 

@@ -114,7 +114,8 @@ void createTables(Connection& connection) {
 
 }  // namespace
 
-Connection openFile(const std::string& path, bool writes) {
+Connection openFile(const std::string& path, OpenMode mode) {
+  const bool writes = mode == OpenMode::Write;
   const std::string nothing = path + ": there is no database: load logs into it first";
   if (look(path) == Found::Nothing) {
     if (!writes) throw EngineError(nothing);
@@ -123,7 +124,7 @@ Connection openFile(const std::string& path, bool writes) {
     constexpr mode_t kMode = 0640;
     const Descriptor made(open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC, kMode));
   }
-  Connection connection(path, writes);
+  Connection connection(path, mode);
   // A program that was killed while it made the tables left a file with a header; SQLite rolls such
   // a file back to an empty one when it opens it.
   std::int64_t version = connection.integer(kReadVersion);

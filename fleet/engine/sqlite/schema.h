@@ -8,7 +8,7 @@
 namespace tavrel::fleet {
 
 /// Throws EngineError, before anything touches the file, when it belongs to another program or
-/// version. With `writes`, an absent or empty file gets the tables.
-Connection openFile(const std::string& path, bool writes);
+/// version. To write, an absent or empty file gets the tables.
+Connection openFile(const std::string& path, OpenMode mode);
 
 }  // namespace tavrel::fleet

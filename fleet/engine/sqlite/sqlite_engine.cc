@@ -21,8 +21,8 @@ void untilEnough(const Read& read) {
 
 class SqliteEngine final : public Engine {
  public:
-  SqliteEngine(const std::string& path, bool writes)
-      : connection_(openFile(path, writes)), reading_(connection_) {}
+  SqliteEngine(const std::string& path, OpenMode mode)
+      : connection_(openFile(path, mode)), reading_(connection_) {}
 
   Appended append(std::span<const LogRecord> records) override {
     if (!appending_) appending_.emplace(connection_);
@@ -49,7 +49,7 @@ class SqliteEngine final : public Engine {
   }
 
   std::unique_ptr<Engine> reader() override {
-    return std::make_unique<SqliteEngine>(connection_.path(), false);
+    return std::make_unique<SqliteEngine>(connection_.path(), OpenMode::Read);
   }
 
  private:
@@ -60,8 +60,8 @@ class SqliteEngine final : public Engine {
 
 }  // namespace
 
-std::unique_ptr<Engine> openSqliteEngine(const std::string& path, bool writes) {
-  return std::make_unique<SqliteEngine>(path, writes);
+std::unique_ptr<Engine> openSqliteEngine(const std::string& path, OpenMode mode) {
+  return std::make_unique<SqliteEngine>(path, mode);
 }
 
 }  // namespace tavrel::fleet

@@ -8,8 +8,8 @@
 
 namespace tavrel::fleet {
 
-/// Throws EngineError. With `writes`, an absent or empty file becomes a database; otherwise the
-/// file is opened read-only. A file that is not a database of this program is left unchanged.
-std::unique_ptr<Engine> openSqliteEngine(const std::string& path, bool writes);
+/// Throws EngineError. To write, an absent or empty file becomes a database; to read, the file
+/// is opened read-only. A file that is not a database of this program is left unchanged.
+std::unique_ptr<Engine> openSqliteEngine(const std::string& path, OpenMode mode);
 
 }  // namespace tavrel::fleet
