@@ -60,9 +60,7 @@ void BHReport::computeAndAddDistribution(BHHistoryDistributionEnumerator& values
     platform_.log->log(LogLevel::Debug, "Treating key %@ as a histogram", forKey);
     histogram = Histogram::create(intervals);
     if (!histogram) {
-      platform_.log->log(
-          LogLevel::Default,
-          "Couldn't allocate histCounts for key %@. Will not calculate histogram values", forKey);
+      platform_.log->log(LogLevel::Default, kHistogramLeftOut, forKey);
     }
   }
 

@@ -37,6 +37,10 @@ plist::Dictionary histogramDictForIntervals(const plist::Array& intervals,
 plist::Dictionary histogramDictForIntervals(const plist::Array& intervals,
                                             std::span<const std::uint32_t> withHistCounts);
 
+/// Logged for a key whose histogram cannot be computed; the log then has only its summary.
+inline constexpr char kHistogramLeftOut[] =
+    "Couldn't allocate histCounts for key %@. Will not calculate histogram values";
+
 /// The counters of one computation. Boundaries are converted once, so that counting a value is a
 /// comparison or two.
 class Histogram {

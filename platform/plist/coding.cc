@@ -8,6 +8,10 @@
 namespace tavrel::plist {
 namespace {
 
+bool looksBinary(std::string_view text) {
+  return text.starts_with("bplist");
+}
+
 // Any XML document begins with "<", after an optional byte-order mark and white space.
 bool looksLikeXml(std::string_view text) {
   using namespace std::string_view_literals;
@@ -21,9 +25,13 @@ bool looksLikeXml(std::string_view text) {
 
 }  // namespace
 
+bool isPropertyList(ByteSpan bytes) {
+  return looksBinary(asText(bytes)) || looksLikeXml(asText(bytes));
+}
+
 Expected<Value> read(ByteSpan bytes) {
   const std::string_view text = asText(bytes);
-  if (text.starts_with("bplist")) return readBinary(bytes);
+  if (looksBinary(text)) return readBinary(bytes);
   if (looksLikeXml(text)) return readXml(bytes);
   if (text.empty()) return Error{"not a property list: the document is empty"};
   return Error{"not a property list: it begins neither with \"bplist00\" nor with \"<\""};

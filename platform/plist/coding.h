@@ -10,6 +10,9 @@
 
 namespace tavrel::plist {
 
+/// Whether the bytes begin as an XML or a binary document does.
+bool isPropertyList(ByteSpan bytes);
+
 /// Reads an XML or a binary document, recognised by content.
 Expected<Value> read(ByteSpan bytes);
 

@@ -65,16 +65,15 @@ Expected<std::string> readInput(ToolContext& context, const std::string& file,
 }
 
 Expected<plist::Value> decodeDocument(std::string_view bytes, std::string_view name) {
-  auto value = looksLikeJson(bytes) ? parseJsonValue(bytes) : plist::read(asBytes(bytes));
-  if (!value) {
-    // The decoder's message does not mention that JSON is also accepted.
-    constexpr std::string_view kNotOne = "not a property list";
-    std::string_view reason = value.error().message;
-    if (!reason.starts_with(kNotOne)) return Error{format("%s: %s", name, reason)};
-    reason.remove_prefix(kNotOne.size());
-    return Error{format("%s: neither a property list nor JSON%s%s", name, reason,
-                        reason.ends_with("\"<\"") ? ", \"{\" or \"[\"" : "")};
+  const bool isJson = looksLikeJson(bytes);
+  if (!isJson && !plist::isPropertyList(asBytes(bytes))) {
+    return Error{format("%s: neither a property list nor JSON: %s", name,
+                        bytes.empty() ? "the document is empty"
+                                      : "it begins neither with \"bplist00\" nor with \"<\", \"{\" "
+                                        "or \"[\"")};
   }
+  auto value = isJson ? parseJsonValue(bytes) : plist::read(asBytes(bytes));
+  if (!value) return Error{format("%s: %s", name, value.error().message)};
   return value;
 }
 
