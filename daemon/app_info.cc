@@ -3,6 +3,7 @@
 #include <algorithm>
 
 #include "base/uuid.h"
+#include "platform/tallied_log.h"
 
 namespace tavrel {
 namespace {
@@ -31,11 +32,11 @@ plist::Array appInfoFrom(const plist::Array& appData) {
     const auto version = app.string("version");
     const auto uuid = appUuidFrom(app.get("uuid"));
     if (!bundle || !version || !uuid) continue;
-    entries.append(plist::Dictionary{{"bundle", app.get("bundle_id")},
-                                     {"version", app.get("version")},
-                                     {"orboID", numberOrZero(app, "orbo_id")},
-                                     {"arch", numberOrZero(app, "arch")},
-                                     {"uuid", *uuid}});
+    entries.append(plist::Dictionary{{kAppBundle, app.get("bundle_id")},
+                                     {kAppVersion, app.get("version")},
+                                     {kAppOrboID, numberOrZero(app, "orbo_id")},
+                                     {kAppArch, numberOrZero(app, "arch")},
+                                     {kAppUuid, *uuid}});
   }
   return entries;
 }

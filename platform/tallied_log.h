@@ -28,6 +28,17 @@ inline constexpr std::string_view kLanguageKey = "BHUserInterfaceLanguage";
 inline constexpr std::string_view kPreferredLanguageKey = "BHPreferredUserInterfaceLanguage";
 inline constexpr std::string_view kRegionKey = "BHUserSetRegionFormat";
 
+/// Members of an application.
+inline constexpr std::string_view kAppBundle = "bundle";    // string
+inline constexpr std::string_view kAppVersion = "version";  // string
+inline constexpr std::string_view kAppUuid = "uuid";        // string
+inline constexpr std::string_view kAppOrboID = "orboID";    // integer
+inline constexpr std::string_view kAppArch = "arch";        // integer
+
+/// Stand for a text and for a tasking's identifier that the device does not know.
+inline constexpr std::string_view kUnknownText = "<unknown>";
+inline constexpr std::string_view kNoTaskingID = "(no tasking id)";
+
 /// Entries of a filed log's metadata.
 inline constexpr std::string_view kLogMetadataType = "LogType";       // string
 inline constexpr std::string_view kLogMetadataName = "LogName";       // string

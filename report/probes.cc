@@ -43,7 +43,7 @@ constexpr VMControl kVMControls[] = {
 };
 
 std::string firstOrUnknown(const std::vector<std::string>& languages) {
-  return languages.empty() ? "<unknown>" : languages.front();
+  return languages.empty() ? std::string(kUnknownText) : languages.front();
 }
 
 std::int64_t readControl(SystemControls& controls, const VMControl& control) {

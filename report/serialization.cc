@@ -72,7 +72,7 @@ plist::Dictionary BHReport::logDictionary(std::int32_t day, const plist::Array& 
       {kDistributionsMember, _distributionsOutput},
       {kHistogramsMember, _histogramsOutput},
       {kTaskingMember, orDefault(taskingPayload, plist::Array::create())},
-      {kTaskIDMember, orDefault(taskingID, "(no tasking id)")},
+      {kTaskIDMember, orDefault(taskingID, kNoTaskingID)},
       {kTaskDigestMember, orDefault(taskingDigest, "(no tasking digest)")},
       {kWhitelistDigestMember, whitelistDigest},
   };
@@ -96,7 +96,7 @@ void BHReport::noteOSVersion(plist::Dictionary& options) {
   if (current == kUnknownOSVersion || plist::Value(current) == stored) return;
   preferences.ZTXPreferencesSetValue(kLastOSVersionKey, current, kTavrelDomain);
   preferences.ZTXPreferencesSynchronize(kTavrelDomain);
-  options.set(kPreviousOSVersionOption, stored.string().value_or("<unknown>"));
+  options.set(kPreviousOSVersionOption, stored.string().value_or(kUnknownText));
 }
 
 void BHReport::addConfigNumber(plist::Dictionary& options) {

@@ -45,7 +45,7 @@ std::string_view shown(std::string_view text) {
 }
 
 bool isUnknown(std::string_view text) {
-  return text == "<unknown>" || text == "(no tasking id)";
+  return text == kUnknownText || text == kNoTaskingID;
 }
 
 bool isInCalendar(plist::Date date) {
@@ -314,8 +314,8 @@ bool LogBuilder::integer(const plist::Number& number) {
     case Place::Cells:
       return addCell(number);
     case Place::Application:
-      if (inner_ == "orboID") record_.applications.back().orboID = number.int64();
-      if (inner_ == "arch") record_.applications.back().arch = number.int64();
+      if (inner_ == kAppOrboID) record_.applications.back().orboID = number.int64();
+      if (inner_ == kAppArch) record_.applications.back().arch = number.int64();
       return true;
     case Place::Distributions:
     case Place::Histograms:
@@ -347,9 +347,9 @@ bool LogBuilder::string(std::string_view text) {
       return inner_ != kRegionKey || keepText(text, record_.region);
     case Place::Application: {
       ApplicationRow& application = record_.applications.back();
-      if (inner_ == "bundle") return keepText(text, application.bundle);
-      if (inner_ == "version") return keepText(text, application.version);
-      return inner_ != "uuid" || keepText(text, application.uuid);
+      if (inner_ == kAppBundle) return keepText(text, application.bundle);
+      if (inner_ == kAppVersion) return keepText(text, application.version);
+      return inner_ != kAppUuid || keepText(text, application.uuid);
     }
     default:
       return isIgnored() || wrongType();

@@ -13,8 +13,6 @@
 namespace tavrel::fleet {
 namespace {
 
-constexpr std::string_view kNoVersion = "<unknown>";
-
 std::string textOf(const plist::Dictionary& dictionary, std::string_view key) {
   const auto text = dictionary.get(key).string();
   return text ? std::string(*text) : std::string();
@@ -23,7 +21,7 @@ std::string textOf(const plist::Dictionary& dictionary, std::string_view key) {
 void setOption(LogMetadata& metadata, std::string_view key, std::string value) {
   if (key == kConfigNumberOption) {
     metadata.configNumber = std::move(value);
-  } else if (key == kPreviousOSVersionOption && value != kNoVersion) {
+  } else if (key == kPreviousOSVersionOption && value != kUnknownText) {
     // The first log of a device says here that there was no earlier version.
     metadata.previousOsVersion = std::move(value);
   }
