@@ -10,7 +10,6 @@ namespace tavrel {
 namespace {
 
 constexpr std::string_view kTaskingChanged = "com.norvane.da.tasking_changed";
-constexpr std::string_view kAggressiveDaysValue = "AggressiveSubmissionDays";
 
 /// Writes preferences, and synchronises each changed domain once.
 class PreferenceWriter {
@@ -41,8 +40,8 @@ template <class Visit>
 void forEachSetting(const plist::Array& payload, Visit visit) {
   for (const plist::Value& element : payload) {
     const plist::Dictionary setting = element.dictionary();
-    const auto domain = setting.string("Domain");
-    const auto key = setting.string("Key");
+    const auto domain = setting.string(kSettingDomain);
+    const auto key = setting.string(kSettingKey);
     if (domain && key) visit(setting, *domain, *key);
   }
 }
@@ -138,7 +137,7 @@ class Tracker {
   }
 
   void submitAggressively() {
-    const auto value = platform_.submission->ZTXGetDATaskingValue(kAggressiveDaysValue).number();
+    const auto value = platform_.submission->ZTXGetDATaskingValue(kAggressiveDaysKey).number();
     const std::int32_t days = value ? value->int32() : 0;
     const auto updateDay = lastUpdate_.number("day");
     const std::int64_t sinceUpdate =
@@ -166,9 +165,10 @@ class Tracker {
   void apply(const plist::Dictionary& scheduled, PreferenceWriter& writer) {
     const plist::Array payload = scheduled.array(kTaskingPayloadKey);
     if (!payload) return;
-    forEachSetting(payload,
-                   [&](const plist::Dictionary& setting, std::string_view domain,
-                       std::string_view key) { writer.set(domain, key, setting.get("Value")); });
+    forEachSetting(payload, [&](const plist::Dictionary& setting, std::string_view domain,
+                                std::string_view key) {
+      writer.set(domain, key, setting.get(kSettingValue));
+    });
     try {
       writer.set(kTavrelDomain, kTaskingIDKey, scheduled.get(kTaskingIDKey));
       writer.set(kTavrelDomain, kTaskingOSKey, build_);

@@ -28,6 +28,11 @@ inline constexpr std::string_view kTaskingOSKey = "TaskingOS";
 inline constexpr std::string_view kTaskingDigestKey = "TaskingDigest";
 inline constexpr std::string_view kTaskingPayloadKey = "TaskingPayload";
 
+/// Members of a setting: the preference that it sets.
+inline constexpr std::string_view kSettingDomain = "Domain";
+inline constexpr std::string_view kSettingKey = "Key";
+inline constexpr std::string_view kSettingValue = "Value";
+
 /// Boolean: whether logs may leave the device. In the same domain are booleans named after an
 /// identifier, which turn its internal diagnostics on.
 inline constexpr std::string_view kDiagnosticsDomain = "com.norvane.zentrix";
@@ -38,9 +43,19 @@ inline constexpr std::string_view kSubmissionFirstDayKey = "DiagnosticSubmission
 /// Values that a tasking has set, among them booleans that switch whitelist groups off by name.
 inline constexpr std::string_view kTaskingDomain = "com.norvane.da";
 
+/// Integer: for how many days after an update of the OS logs are submitted at once.
+inline constexpr std::string_view kAggressiveDaysKey = "AggressiveSubmissionDays";
+
 /// Where another component schedules a tasking.
 inline constexpr std::string_view kScheduleDomain = "com.norvane.Drovelink";
 inline constexpr std::string_view kScheduledTaskingKey = "ScheduledTasking";
+
+/// Settings of the storage statistics: a real number, the write amplification above which a run
+/// logs the validity list; a boolean, set on a demonstration device.
+inline constexpr std::string_view kNandInfoDomain = "com.norvane.NANDInfo";
+inline constexpr std::string_view kUserAmplificationKey = "userWAmp";
+inline constexpr std::string_view kDemoDomain = "com.norvane.demo-settings";
+inline constexpr std::string_view kStoreDemoModeKey = "StoreDemoMode";
 
 /// Begins the line that the daemon logs when it begins a day's tasks; the day follows. The record
 /// of the last run takes the day from it (docs/status.md).

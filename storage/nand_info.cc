@@ -7,6 +7,7 @@
 #include <string>
 #include <string_view>
 
+#include "platform/persisted_state.h"
 #include "storage/fetch_statistics.h"
 #include "storage/key_map.h"
 #include "storage/nand_info_keys.h"
@@ -71,7 +72,7 @@ void set64(plist::Dictionary& info, std::string_view key, std::uint64_t value) {
 bool isDemoDevice(Preferences& preferences) {
   bool exists = false;
   const bool value =
-      preferences.ZTXPreferencesGetBoolValue("StoreDemoMode", "com.norvane.demo-settings", &exists);
+      preferences.ZTXPreferencesGetBoolValue(kStoreDemoModeKey, kDemoDomain, &exists);
   return exists && value;
 }
 

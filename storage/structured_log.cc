@@ -7,6 +7,7 @@
 #include <span>
 
 #include "platform/guarded.h"
+#include "platform/persisted_state.h"
 #include "storage/device_buffer.h"
 #include "storage/driver_client.h"
 #include "storage/fetch_statistics.h"
@@ -63,7 +64,7 @@ WriteAmplification amplificationIn(const ASPContext& context) {
 /// The threshold from the preference; nothing when that is absent or out of range.
 std::optional<float> preferredThreshold(Preferences& preferences) {
   const auto number =
-      preferences.ZTXPreferencesGetValue("userWAmp", "com.norvane.NANDInfo").number();
+      preferences.ZTXPreferencesGetValue(kUserAmplificationKey, kNandInfoDomain).number();
   if (!number || !number->isFloating()) return std::nullopt;
   if (!(number->real() > 0 && number->real() < 10)) return std::nullopt;
   return static_cast<float>(number->real());

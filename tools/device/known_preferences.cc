@@ -7,6 +7,9 @@
 
 #include "base/format.h"
 #include "platform/linux/logs/submission_permission.h"
+#include "platform/persisted_state.h"
+#include "platform/statistics_store.h"
+#include "storage/parse/nand_log_writer.h"
 #include "tools/console/value_text.h"
 
 namespace tavrel {
@@ -57,24 +60,23 @@ struct KnownPreference {
 
 // The list of docs/files.md. In two domains, the other keys are named after what they switch.
 constexpr std::array kKnown = {
-    KnownPreference{"com.norvane.zentrix", "DiagnosticSubmissionEnabled", kBoolean},
-    KnownPreference{"com.norvane.zentrix", "DiagnosticSubmissionFirstDay", kFirstDay},
-    KnownPreference{"com.norvane.zentrix", "", kBoolean},
-    KnownPreference{"com.norvane.da", "AggressiveSubmissionDays", kCount},
-    KnownPreference{"com.norvane.da", "", kBoolean},
-    KnownPreference{"com.norvane.Drovelink", "ScheduledTasking", kDictionary},
-    KnownPreference{"com.norvane.tallied.tavrel", "LastCrashLogSerializationDateInDaysSince1970",
-                    kCount},
-    KnownPreference{"com.norvane.tallied.tavrel", "LastLogOutcome", kString},
-    KnownPreference{"com.norvane.tallied.tavrel", "LastOSVersion", kString},
-    KnownPreference{"com.norvane.tallied.tavrel", "LastOSUpdate", kDictionary},
-    KnownPreference{"com.norvane.tallied.tavrel", "TaskingID", kString},
-    KnownPreference{"com.norvane.tallied.tavrel", "TaskingOS", kString},
-    KnownPreference{"com.norvane.tallied.tavrel", "TaskingPayload", kArray},
-    KnownPreference{"com.norvane.tallied", "DatabaseCorruptionCount", kCount},
-    KnownPreference{"com.norvane.NANDInfo", "userWAmp", kAmplification},
-    KnownPreference{"com.norvane.zentrix.tavrel", "SSLastLoggedAt", kDate},
-    KnownPreference{"com.norvane.demo-settings", "StoreDemoMode", kBoolean},
+    KnownPreference{kDiagnosticsDomain, kSubmissionEnabledKey, kBoolean},
+    KnownPreference{kDiagnosticsDomain, kSubmissionFirstDayKey, kFirstDay},
+    KnownPreference{kDiagnosticsDomain, "", kBoolean},
+    KnownPreference{kTaskingDomain, kAggressiveDaysKey, kCount},
+    KnownPreference{kTaskingDomain, "", kBoolean},
+    KnownPreference{kScheduleDomain, kScheduledTaskingKey, kDictionary},
+    KnownPreference{kTavrelDomain, kLastRunDayKey, kCount},
+    KnownPreference{kTavrelDomain, kLastLogOutcomeKey, kString},
+    KnownPreference{kTavrelDomain, kLastOSVersionKey, kString},
+    KnownPreference{kTavrelDomain, kLastOSUpdateKey, kDictionary},
+    KnownPreference{kTavrelDomain, kTaskingIDKey, kString},
+    KnownPreference{kTavrelDomain, kTaskingOSKey, kString},
+    KnownPreference{kTavrelDomain, kTaskingPayloadKey, kArray},
+    KnownPreference{kStoreCorruptionsDomain, kStoreCorruptionsKey, kCount},
+    KnownPreference{kNandInfoDomain, kUserAmplificationKey, kAmplification},
+    KnownPreference{kDefaultPreferenceDomain, kNandLogLastLoggedKey, kDate},
+    KnownPreference{kDemoDomain, kStoreDemoModeKey, kBoolean},
 };
 
 }  // namespace
@@ -88,11 +90,10 @@ std::optional<PreferenceFault> faultOfPreference(std::string_view domain, std::s
   if (known == kKnown.end() || value.isNull() || known->form.fits(value)) return std::nullopt;
   const bool isLong = value.dictionary() || value.array() || value.data();
   // Give no example that would grant the permission when copied.
-  const bool isPermission = known->key.starts_with("DiagnosticSubmission");
   return PreferenceFault{
       format("preference %s of domain %s is %s, not %s", key, domain, known->form.text,
              isLong ? kindWithArticle(value) : inlineText(value)),
-      isPermission
+      isOfPermission(domain, key)
           ? "use 'tavrelctl allow' or 'tavrelctl deny'"
           : format("give 'tavrelctl prefs set %s %s %s'", domain, key, known->form.example)};
 }

@@ -89,10 +89,10 @@ std::string dayOrText(const plist::Value& value) {
 
 Json json(const Tasking& tasking) {
   if (!tasking.identifier && !tasking.payload) return nullptr;
-  Json object = {{"TaskingID", jsonOf(tasking.identifier)}};
-  if (tasking.system) object["TaskingOS"] = jsonOf(tasking.system);
-  object["TaskingDigest"] = jsonOf(tasking.digest);
-  object["TaskingPayload"] = jsonOf(tasking.payload);
+  Json object = {{kTaskingIDKey, jsonOf(tasking.identifier)}};
+  if (tasking.system) object[kTaskingOSKey] = jsonOf(tasking.system);
+  object[kTaskingDigestKey] = jsonOf(tasking.digest);
+  object[kTaskingPayloadKey] = jsonOf(tasking.payload);
   return object;
 }
 
@@ -111,8 +111,8 @@ void print(ToolContext& context, std::string_view title, const Tasking& tasking)
   Table table({{"DOMAIN"}, {"KEY"}, {"VALUE"}}, 4);
   for (const plist::Value& setting : settings) {
     const plist::Dictionary dictionary = setting.dictionary();
-    table.add({text(dictionary.get("Domain")), text(dictionary.get("Key")),
-               inlineText(dictionary.get("Value"))});
+    table.add({text(dictionary.get(kSettingDomain)), text(dictionary.get(kSettingKey)),
+               inlineText(dictionary.get(kSettingValue))});
   }
   if (!table.empty()) table.print(context.page());
 }
@@ -125,7 +125,7 @@ void show(ToolContext& context) {
     const Json lastUpdate = taskings.lastUpdate ? jsonOf(taskings.lastUpdate) : Json(nullptr);
     context.printJson({{"scheduled", json(taskings.scheduled)},
                        {"applied", json(taskings.applied)},
-                       {"LastOSUpdate", lastUpdate},
+                       {kLastOSUpdateKey, lastUpdate},
                        {"next_run", taskings.nextRun()}});
     return;
   }
@@ -170,7 +170,7 @@ void schedule(ToolContext& context, const std::string& path) {
 
   const plist::Dictionary dictionary = tasking->dictionary();
   context.out() << "Scheduled tasking " << printable(text(dictionary.get(kTaskingIDKey)))
-                << " with " << counted(dictionary.array("TaskingPayload").size(), "setting")
+                << " with " << counted(dictionary.array(kTaskingPayloadKey).size(), "setting")
                 << ". The next daily run " << Taskings(context).nextRun() << ".\n";
 }
 
