@@ -16,29 +16,11 @@
 
 #include "base/plist.h"
 #include "ioreport/error_object.h"
+#include "platform/report_protocol.h"  // IWYU pragma: export
 
 namespace tavrel {
 
 inline constexpr std::int64_t kInvalidValue = std::numeric_limits<std::int64_t>::min();
-
-/// The first byte of a channel type: the layout of its elements' values.
-inline constexpr std::uint8_t kFormatUnknown = 0;
-inline constexpr std::uint8_t kFormatSimple = 1;
-inline constexpr std::uint8_t kFormatState = 2;
-inline constexpr std::uint8_t kFormatHistogram = 3;
-inline constexpr std::uint8_t kFormatSimpleArray = 4;
-
-/// The fields of a channel type. Its other bits pass through unchanged.
-constexpr std::uint8_t formatOf(std::uint64_t channelType) {
-  return static_cast<std::uint8_t>(channelType);
-}
-constexpr std::uint16_t categoriesOf(std::uint64_t channelType) {
-  return static_cast<std::uint16_t>(channelType >> 16);
-}
-/// How many elements the channel occupies in a sample.
-constexpr std::uint16_t elementCountOf(std::uint64_t channelType) {
-  return static_cast<std::uint16_t>(channelType >> 32);
-}
 
 /// A number as a signed 64-bit integer; an unsigned one keeps its bits. `kInvalidValue` for a real
 /// number that is not whole or exceeds 64 bits.

@@ -1,7 +1,9 @@
-// The keys of channels, aggregates and legends, and of the services that publish them.
+// The keys of channels and aggregates, besides those that they share with legends.
 #pragma once
 
 #include <string_view>
+
+#include "platform/report_protocol.h"  // IWYU pragma: export
 
 namespace tavrel {
 
@@ -11,11 +13,6 @@ inline constexpr std::string_view kDriverNameKey = "DriverName";
 inline constexpr std::string_view kLegendChannelKey = "LegendChannel";
 inline constexpr std::string_view kRawElementsKey = "RawElements";  // of a sample
 
-// In a channel, and in a group entry of a legend.
-inline constexpr std::string_view kGroupNameKey = "IOReportGroupName";
-inline constexpr std::string_view kSubGroupNameKey = "IOReportSubGroupName";
-inline constexpr std::string_view kChannelInfoKey = "IOReportChannelInfo";
-
 // Cached by getters in a channel.
 inline constexpr std::string_view kChannelNameKey = "ChannelName";
 inline constexpr std::string_view kUnitLabelKey = "UnitLabel";
@@ -23,17 +20,11 @@ inline constexpr std::string_view kStateNamesKey = "StateNames";
 inline constexpr std::string_view kProcessedConfigKey = "ProcessedChannelConfig";
 
 // In the channel info.
-inline constexpr std::string_view kChannelUnitKey = "IOReportChannelUnit";
 inline constexpr std::string_view kChannelConfigKey = "IOReportChannelConfig";
 
-// In an aggregate; the first also in a group entry of a legend.
-inline constexpr std::string_view kChannelsKey = "IOReportChannels";
+// In an aggregate.
 inline constexpr std::string_view kDriversKey = "IOReportDrivers";
 inline constexpr std::string_view kChannelGroupsKey = "IOReportChannelGroups";
 inline constexpr std::string_view kQueryOptsKey = "QueryOpts";
-
-// Properties of a driver's service.
-inline constexpr std::string_view kLegendKey = "IOReportLegend";
-inline constexpr std::string_view kLegendPublicKey = "IOReportLegendPublic";
 
 }  // namespace tavrel

@@ -75,7 +75,7 @@ std::uint64_t nowInTicks() {
 bool hasValue(const LiveChannel& channel, std::span<const std::int64_t> values) {
   const auto isUnset = [](std::int64_t value) { return value == kUnset; };
   // With one unknown residency, the shares of all states would be wrong.
-  if (channel.format == ChannelFormat::State)
+  if (channel.format == kFormatState)
     return std::ranges::none_of(values.subspan(channel.elements), isUnset);
   return !std::ranges::all_of(values, isUnset);
 }
@@ -89,10 +89,10 @@ ElementValues stateValues(std::uint64_t id, std::span<const std::int64_t> values
 }
 
 // The last element of an array may have room for more values than are left.
-ElementValues numberValues(ChannelFormat format, std::span<const std::int64_t> values,
+ElementValues numberValues(std::uint8_t format, std::span<const std::int64_t> values,
                            std::size_t element) {
   ElementValues result;
-  result.fill(format == ChannelFormat::SimpleArray ? kUnset : 0);
+  result.fill(format == kFormatSimpleArray ? kUnset : 0);
   const auto rest = values.subspan(element * kElementValues);
   std::copy_n(rest.begin(), std::min(rest.size(), kElementValues), result.begin());
   return result;
@@ -255,7 +255,7 @@ class LiveMachine::Sampling final : public LiveSampling {
       storeLittle64(record, kElementDriver, source.driverID());
       storeLittle64(record, kElementChannel, channel.id);
       storeLittle64(record, kElementType, channel.type());
-      if (channel.format == ChannelFormat::State) {
+      if (channel.format == kFormatState) {
         const Residency& states = source.residency(channel);
         const bool isCurrent = states.currentSlot < source.slots().size() &&
                                source.slots()[states.currentSlot] == states.numbers[element];

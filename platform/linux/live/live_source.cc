@@ -78,14 +78,14 @@ void LiveSource::add(const Place& place, LiveChannel channel) {
 
 void LiveSource::addSimple(const Place& place, std::string name, std::uint32_t slot,
                            std::uint16_t categories) {
-  add(place, {std::move(name), 0, ChannelFormat::Simple, categories, 1, slot, 1});
+  add(place, {std::move(name), 0, kFormatSimple, categories, 1, slot, 1});
 }
 
 void LiveSource::addArray(const Place& place, std::string name, std::uint32_t firstSlot,
                           std::uint32_t slots) {
   const std::uint32_t elements = (slots + kArrayValues - 1) / kArrayValues;
   if (elements == 0 || elements > limits::kLiveElements) return;
-  add(place, {std::move(name), 0, ChannelFormat::SimpleArray, kToolCategory,
+  add(place, {std::move(name), 0, kFormatSimpleArray, kToolCategory,
               static_cast<std::uint16_t>(elements), firstSlot, slots});
 }
 
@@ -94,8 +94,8 @@ void LiveSource::addStates(const Place& place, std::string name, std::uint32_t f
   const std::size_t count = residency.ids.size();
   if (count == 0 || count > limits::kLiveElements) return;
   residencies_.push_back(std::move(residency));
-  add(place, {std::move(name), 0, ChannelFormat::State, kToolCategory,
-              static_cast<std::uint16_t>(count), firstSlot, static_cast<std::uint32_t>(2 * count),
+  add(place, {std::move(name), 0, kFormatState, kToolCategory, static_cast<std::uint16_t>(count),
+              firstSlot, static_cast<std::uint32_t>(2 * count),
               static_cast<std::int32_t>(residencies_.size() - 1)});
 }
 
@@ -118,10 +118,10 @@ void LiveSource::publishFolds() {
 
 plist::Dictionary LiveSource::service() const {
   plist::Array legend = plist::Array::create(groups_.size());
-  const plist::String groupKey("IOReportGroupName");
-  const plist::String subGroupKey("IOReportSubGroupName");
-  const plist::String infoKey("IOReportChannelInfo");
-  const plist::String channelsKey("IOReportChannels");
+  const plist::String groupKey(kGroupNameKey);
+  const plist::String subGroupKey(kSubGroupNameKey);
+  const plist::String infoKey(kChannelInfoKey);
+  const plist::String channelsKey(kChannelsKey);
   for (const Group& group : groups_) {
     plist::Array channels = plist::Array::create(group.channels.size());
     for (const LiveChannel& channel : group.channels) {
@@ -133,7 +133,7 @@ plist::Dictionary LiveSource::service() const {
     if (!group.subGroup.empty()) entry.set(subGroupKey, group.subGroup);
     if (group.unit != kPlain) {
       entry.set(infoKey,
-                plist::Dictionary{{"IOReportChannelUnit", static_cast<std::int64_t>(group.unit)}});
+                plist::Dictionary{{kChannelUnitKey, static_cast<std::int64_t>(group.unit)}});
     }
     entry.set(channelsKey, channels);
     legend.append(entry);
@@ -141,8 +141,7 @@ plist::Dictionary LiveSource::service() const {
   return {{"Class", className_},
           {"Name", name_},
           {"EntryID", static_cast<std::int64_t>(driverID())},
-          {"Properties",
-           plist::Dictionary{{"IOReportLegendPublic", true}, {"IOReportLegend", legend}}}};
+          {"Properties", plist::Dictionary{{kLegendPublicKey, true}, {kLegendKey, legend}}}};
 }
 
 void LiveSource::wantSlots(std::uint32_t first, std::uint32_t count,
@@ -160,7 +159,7 @@ void LiveSource::wantSlots(std::uint32_t first, std::uint32_t count,
 
 void LiveSource::want(const LiveChannel& channel, std::vector<bool>& wanted) const {
   wantSlots(channel.firstSlot, channel.slots, wanted);
-  if (channel.format == ChannelFormat::State) {
+  if (channel.format == kFormatState) {
     const std::uint32_t current = residency(channel).currentSlot;
     if (current != UINT32_MAX) wantSlots(current, 1, wanted);
   }

@@ -21,6 +21,7 @@
 #include "base/plist.h"
 #include "platform/linux/live/kernel_file.h"
 #include "platform/linux/live/kernel_text.h"
+#include "platform/report_protocol.h"
 #include "platform/report_units.h"
 
 namespace tavrel::live {
@@ -29,9 +30,6 @@ using namespace units;
 
 inline constexpr std::uint16_t kToolCategory = 0x0001;
 inline constexpr std::uint16_t kDailyCategory = 0x0100;
-
-/// Channel formats, with their numbers in legends.
-enum class ChannelFormat : std::uint8_t { Simple = 1, State = 2, SimpleArray = 4 };
 
 /// Where a channel is filed, and its unit.
 struct Place {
@@ -43,18 +41,14 @@ struct Place {
 struct LiveChannel {
   std::string name;
   std::uint64_t id;
-  ChannelFormat format;
+  std::uint8_t format;
   std::uint16_t categories;
   std::uint16_t elements;
   std::uint32_t firstSlot;
   std::uint32_t slots;
   std::int32_t states = -1;  // of a residency: its index in `residencies_`
 
-  /// The channel type, as legends and elements contain it.
-  std::uint64_t type() const {
-    return static_cast<std::uint64_t>(format) | std::uint64_t{categories} << 16 |
-           std::uint64_t{elements} << 32;
-  }
+  std::uint64_t type() const { return channelTypeOf(format, categories, elements); }
 };
 
 /// The states of a residency.
