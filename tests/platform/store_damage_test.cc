@@ -338,50 +338,5 @@ TEST_F(StoreTest, AFailingReadIsNoDamage) {
                                       "free"));
 }
 
-TEST_F(StoreTest, AStoreThatCannotBeReadOnThreeDaysIsSetAside) {
-  set({{"k", kToday, 1}});
-  settle();
-  const std::string note = store_->path() + "-unreadable";
-  const auto runDaily = [&] {
-    clock.time = plist::Date::since1970(clock.time.secondsSince1970() + 86'400);
-    store_ = open();
-    for (int i = 0; i < 2; ++i) {
-      store_->BHClientSetValueForScalarKey("w", 1);
-      store_->BHClientCheckpoint();
-    }
-  };
-  // The note says that the device was restarted since.
-  const auto restart = [&] {
-    const std::string content = contentOf(note);
-    std::ofstream(note) << content.substr(0, content.rfind(' ')) << " earlier";
-  };
-  {
-    const FailingReads reads(0, 1);
-    runDaily();
-    restart();
-    runDaily();
-  }
-  EXPECT_TRUE(std::filesystem::exists(note));
-  runDaily();
-  EXPECT_FALSE(std::filesystem::exists(note)) << "it can be read again";
-  const FailingReads reads(0, 1);
-  runDaily();
-  restart();
-  runDaily();
-  for (int jump = 0; jump < 3; ++jump)
-    runDaily();  // a clock that is set ahead
-  EXPECT_EQ(setAsideFiles(), Lines{});
-  restart();
-  log.lines.clear();
-  runDaily();
-  ASSERT_EQ(setAsideFiles().size(), 1U);
-  EXPECT_EQ(log.lines.back(), where() +
-                                  "the file cannot be read (Input/output error): check the file "
-                                  "system that holds it; it is now " +
-                                  setAsideFiles()[0] +
-                                  " and a new store begins: inspect or remove that file");
-  EXPECT_FALSE(std::filesystem::exists(note));
-}
-
 }  // namespace
 }  // namespace tavrel

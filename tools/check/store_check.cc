@@ -92,10 +92,6 @@ void checkCompanions(CheckScene& scene, const std::string& path, Check& check) {
                counted(static_cast<std::uint64_t>(damaged), "damaged store") + " set aside in " +
                    file.parent_path().string());
   }
-  if (FileSystem::status(path + std::string(kUnreadableEnding))) {
-    addFinding(check, CheckState::Warning,
-               "the device has failed to read it: daily runs set it aside on the third such day");
-  }
   if (FileSystem::status(path + "-kept")) {
     addFinding(check, CheckState::Warning, "values wait in " + path + "-kept for a commit");
   }

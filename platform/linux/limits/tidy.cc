@@ -64,8 +64,6 @@ void Tidy::trim(TidyReport& report) {
   }
   TidiedKind& store = report.kinds[static_cast<std::size_t>(Kept::Store)];
   trimStore(store.bounds, store, report.failures);
-  // Before the run of yesterday, a store may still hold rows to report.
-  if (lastRunDay().value_or(INT64_MIN) >= store_.BHDaysSince1970() - 1) store_.replaceUnreadable();
   count(report, report.failures);
 }
 

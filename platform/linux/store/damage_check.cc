@@ -18,9 +18,8 @@ namespace {
 constexpr std::size_t kBlock = 64 << 10;
 
 StoreFailure unreadable(const char* what, int code) {
-  return {code == EIO ? StoreFault::Device : StoreFault::Refused,
-          std::string(what) + " cannot be read (" + systemText(code) +
-              "): check the file system that holds it"};
+  return {StoreFault::Device, std::string(what) + " cannot be read (" + systemText(code) +
+                                  "): check the file system that holds it"};
 }
 
 // Reads the database file through SQLite: closing a descriptor of our own would release this
@@ -82,14 +81,6 @@ std::optional<StoreFailure> confirmDamage(const std::string& path,
     } catch (const StoreFailure& failure) {
       if (failure.fault != StoreFault::Damaged) throw;
     }
-    return failureToRead(path);
-  } catch (const StoreFailure& failure) {
-    return failure;
-  }
-}
-
-std::optional<StoreFailure> failureToRead(const std::string& path) {
-  try {
     readDatabase(path);
     readLog(path);
   } catch (const StoreFailure& failure) {

@@ -21,8 +21,4 @@ std::optional<StoreFailure> confirmDamage(const std::string& path,
                                           const std::shared_ptr<BusyBudget>& busy,
                                           bool leavesNoTrace);
 
-/// Reads every byte of the store. Nothing when that succeeds; `StoreFault::Device` when the device
-/// fails (EIO).
-std::optional<StoreFailure> failureToRead(const std::string& path);
-
 }  // namespace tavrel

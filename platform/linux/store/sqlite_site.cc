@@ -97,21 +97,13 @@ void StoreSite::logFailure(const StoreFailure& failure, std::string_view consequ
 std::optional<StoreFailure> StoreSite::setAside(const std::optional<FileIdentity>& damaged,
                                                 const StoreFailure& failure) const {
   if (!damaged || FileIdentity::of(path) != damaged) return std::nullopt;
-  if (auto other = confirmDamage(path, busy, changesNothing)) {
-    *seemsUnreadable = true;
-    return other;
-  }
+  if (auto other = confirmDamage(path, busy, changesNothing)) return other;
   if (changesNothing) {
     return StoreFailure{failure.fault, failure.message + "; the next run sets it aside"};
   }
-  return moveAside(*damaged, failure);
-}
-
-std::optional<StoreFailure> StoreSite::moveAside(const FileIdentity& file,
-                                                 const StoreFailure& failure) const {
   try {
     const StoreFolderLock lock(path, *busy);
-    if (FileIdentity::of(path) != file) return std::nullopt;
+    if (FileIdentity::of(path) != damaged) return std::nullopt;
     withholdFromOthers(path);
     const std::string name =
         freeName(path + std::string(kSetAsideMark) + compactStamp(clock.now()));

@@ -78,8 +78,6 @@ struct StoreSite {
   bool changesNothing = false;
   /// Failures already logged. Those that last until somebody intervenes are logged only once.
   std::shared_ptr<std::set<std::string>> logged = std::make_shared<std::set<std::string>>();
-  /// Set when the device may have failed to read the store.
-  std::shared_ptr<bool> seemsUnreadable = std::make_shared<bool>(false);
 
   /// "statistics store PATH: MESSAGE".
   std::string describe(const StoreFailure& failure) const;
@@ -103,10 +101,6 @@ struct StoreSite {
   /// could not be moved. No connection to the store may be open.
   std::optional<StoreFailure> setAside(const std::optional<FileIdentity>& damaged,
                                        const StoreFailure& failure) const;
-
-  /// The same, without the second look.
-  std::optional<StoreFailure> moveAside(const FileIdentity& file,
-                                        const StoreFailure& failure) const;
 
   /// What the latest of the stores took that were set aside, by any process, and are still there.
   /// It had rows of days up to when it was set aside or, when the clock was clearly wrong then, up

@@ -11,15 +11,9 @@
 #include "platform/guarded.h"
 #include "platform/linux/store/damage_check.h"
 #include "platform/linux/store/sqlite_log_file.h"
-#include "platform/linux/store/unreadable_days.h"
 #include "platform/store_path.h"
 
 namespace tavrel {
-namespace {
-
-constexpr std::int64_t kUnreadableDays = 3;
-
-}  // namespace
 
 SqliteStore::SqliteStore(const DeviceRoot& root, Clock& clock, Preferences& preferences,
                          SystemLog& log, int busyMilliseconds, bool changesNothing)
@@ -80,7 +74,6 @@ std::optional<StoreFailure> SqliteStore::attempt(Operation operation) {
       operation(identity);
       return std::nullopt;
     } catch (const StoreFailure& failure) {
-      if (failure.fault == StoreFault::Device) *site_.seemsUnreadable = true;
       if (failure.fault != StoreFault::Damaged || again) return failure;
       if (auto obstacle = site_.setAside(identity, failure)) return obstacle;
     }
@@ -141,23 +134,7 @@ bool SqliteStore::BHClientCheckpoint() {
   std::optional<SqliteConnection> connection;
   const bool areKept = commit(connection);
   checkpoint(std::move(connection));
-  // The first checkpoint precedes the report, which may still be able to read yesterday.
-  if (std::exchange(hasCheckpointed_, true)) replaceUnreadable();
   return areKept;
-}
-
-void SqliteStore::replaceUnreadable() {
-  const std::string note = site_.path + std::string(kUnreadableEnding);
-  if (!*site_.seemsUnreadable && !FileSystem::status(note)) return;
-  const auto file = FileIdentity::of(site_.path);
-  if (const auto failure = file ? failureToRead(site_.path) : std::nullopt) {
-    if (failure->fault != StoreFault::Device ||
-        countUnreadableDay(note, *file, BHDaysSince1970()) < kUnreadableDays) {
-      return;
-    }
-    if (const auto obstacle = site_.moveAside(*file, *failure)) return site_.logFailure(*obstacle);
-  }
-  FileSystem().discard(note);
 }
 
 void SqliteStore::checkpoint(std::optional<SqliteConnection> connection) {

@@ -36,9 +36,6 @@
 
 namespace tavrel {
 
-/// Of the file beside the store that counts days on which the device failed to read the store.
-inline constexpr std::string_view kUnreadableEnding = "-unreadable";
-
 class SqliteStore : public StatisticsStore {
  public:
   /// The services must outlive the store. `busyMilliseconds`: how long all operations together wait
@@ -75,10 +72,6 @@ class SqliteStore : public StatisticsStore {
     return damage ? setAside(*damage) : error;
   }
 
-  /// For the end of a day's work. When the device has failed to read the store in such work on
-  /// three days in a row, sets the store aside: the next change begins a new one.
-  void replaceUnreadable();
-
   /// Opens the store to remove days; null when there is none.
   Expected<std::unique_ptr<SqliteTrim>> beginTrim();
 
@@ -110,7 +103,6 @@ class SqliteStore : public StatisticsStore {
   std::optional<StoreFailure> attempt(Operation operation);
 
   StoreSite site_;
-  bool hasCheckpointed_ = false;
   // By day and key.
   std::map<std::pair<std::int32_t, std::string>, std::int64_t> pending_;
 };
