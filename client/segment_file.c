@@ -103,6 +103,16 @@ static bool mayMakeFilesThatLarge(void) {
   return getrlimit(RLIMIT_FSIZE, &limit) != 0 || limit.rlim_cur >= kBHSegmentBytes;
 }
 
+/* Whether the file system has its reserve free beside these bytes. */
+static bool leavesReserve(int file, size_t bytes) {
+  struct statfs fileSystem;
+  if (fstatfs(file, &fileSystem) != 0) return false;
+  const size_t blocks = bytes / (size_t)fileSystem.f_bsize;
+  if (fileSystem.f_bavail >= fileSystem.f_blocks / kReservedPart + blocks) return true;
+  errno = ENOSPC;
+  return false;
+}
+
 /* The C library's function, unlike syscall(), passes 64-bit lengths correctly on 32-bit machines.
  * It is a cancellation point, but not while cancellation is off. */
 static bool allocateFile(int file) {
@@ -125,7 +135,9 @@ static struct Segment* mapSegment(int file) {
 
   bool isThere = madvise(segment, kBHKeyTable, MADV_POPULATE_WRITE) == 0;
   /* Before Linux 5.14, memory can be allocated only through the file, so allocate all of it now. */
-  if (!isThere && errno == EINVAL) isThere = allocateFile(file);
+  if (!isThere && errno == EINVAL) {
+    isThere = leavesReserve(file, kBHSegmentBytes) && allocateFile(file);
+  }
   if (!isThere) {
     const int error = errno;
     munmap(segment, kBHSegmentBytes);
@@ -181,7 +193,7 @@ struct Segment* bhBeginSegment(const char* folder, struct SegmentName* name,
   struct stat entries;
   if (fstatfs(directory, &fileSystem) != 0 || fileSystem.f_type != TMPFS_MAGIC) {
     *status = BHClientStatusNotInMemory;
-  } else if (fileSystem.f_bavail < fileSystem.f_blocks / kReservedPart) {
+  } else if (!leavesReserve(directory, 0)) {
     *status = BHClientStatusNoSpace;
   } else {
     segment = beginIn(directory, name, status);
