@@ -275,7 +275,12 @@ TEST_F(LimitsTest, RowsOutOfOrderReplaceTheStore) {
     other.at(other.find("com.example.0003")) ^= 8;
     std::ofstream(store.path()) << first;
     log.lines.clear();
-    EXPECT_EQ(tidy().failures, Lines{});
+    setLastRun(kToday - 2);
+    tidy();
+    EXPECT_EQ(log.lines, Lines{}) << "yesterday is still to be reported";
+    setLastRun(kToday - 1);
+    EXPECT_EQ(tidy().failures,
+              Lines{"statistics store: it was damaged and is set aside, with all its days"});
     ASSERT_EQ(log.lines.size(), 1U);
     EXPECT_TRUE(log.lines[0].starts_with(reason) &&
                 log.lines[0].find("; it is now ") != std::string::npos)

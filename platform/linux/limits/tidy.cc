@@ -112,10 +112,14 @@ void Tidy::trimStore(const Bounds& bounds, TidiedKind& tidied, std::vector<std::
   const auto goesOnAfter = [&](const Error& error) {
     if (std::exchange(isPartlyUnreadable, true)) return true;
     const bool looksDamaged = (*trim)->damage().has_value();
-    const Status replaced = store_.replaceDamaged(*std::move(trim), error);
-    if (replaced) return false;
-    failures.push_back(replaced.error().message);
-    if (!looksDamaged) return false;
+    // Before the run of yesterday, the store may hold rows to report.
+    const bool mustStay = lastRunDay().value_or(INT64_MIN) < store_.BHDaysSince1970() - 1;
+    const Status replaced =
+        mustStay ? Status(error) : store_.replaceDamaged(*std::move(trim), error);
+    failures.push_back(replaced ? "statistics store: it was damaged and is set aside, with all "
+                                  "its days"
+                                : replaced.error().message);
+    if (replaced || !looksDamaged) return false;
     trim = store_.beginTrim();
     return trim && *trim;
   };
