@@ -260,7 +260,8 @@ Uploader::Step Uploader::stopAtLimit() {
 // A log is worth more than its metadata, whose loss keeps none back.
 plist::Dictionary Uploader::metadataOf(const WaitingLog& log) {
   const std::string path = outbox_.metadataPath(log.name);
-  std::string fault;
+  std::string& fault = metadataFault_;
+  fault.clear();
   if (const auto bytes = services_.files.read(path, limits::kPropertyListBytes); !bytes) {
     fault = bytes.error().message;
   } else {
@@ -268,7 +269,6 @@ plist::Dictionary Uploader::metadataOf(const WaitingLog& log) {
     if (value && value->dictionary()) return value->dictionary();
     fault = path + ": " + (value ? "it is not a dictionary" : value.error().message);
   }
-  services_.log.log(LogLevel::Error, "log %s is sent without metadata: %s", log.name, fault);
   return {};
 }
 
@@ -323,6 +323,10 @@ Uploader::Step Uploader::confirm(const WaitingLog& log, const PackedLog& packed)
     return Step::Next;
   }
   if (Status removed = outbox_.remove(log.name); !removed) return failToMove(removed.error());
+  if (!metadataFault_.empty()) {
+    services_.log.log(LogLevel::Error, "log %s was sent without metadata: %s", log.name,
+                      metadataFault_);
+  }
   ++sent_;
   ++state_.sent;
   state_.lastSuccess = services_.clock.now();

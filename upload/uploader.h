@@ -97,6 +97,7 @@ class Uploader {
   std::size_t refused_ = 0;
   std::size_t held_ = 0;  // in the last pass, because the permission does not cover their day
   bool lacksPermission_ = false;  // from the start; logs may wait
+  std::string metadataFault_;     // of the log that is sent; empty without one
   bool tried_ = false;
   bool failed_ = false;    // a transfer
   std::string complaint_;  // the first of this run

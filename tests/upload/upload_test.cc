@@ -368,7 +368,7 @@ TEST(Upload, SaysWhatItCannotReadAndSendsTheRest) {
   EXPECT_EQ(device.log.lines,
             (Lines{"cannot list " + pending + ": Not a directory",
                    "cannot read " + noLog + ": not a regular file",
-                   "log " + nameOf(2) + " is sent without metadata: " + device.root.path(metadata) +
+                   "log " + nameOf(2) + " was sent without metadata: " + device.root.path(metadata) +
                        ": not a property list: it begins neither with "
                        "\"bplist00\" nor with \"<\"",
                    "logs sent: 1, refused by the server: 0"}));
