@@ -74,9 +74,12 @@ bool isSpecial(std::string_view key) {
 
 /// "line 2, column 4"; the line is left out when there is only one.
 std::string placeText(std::string_view text, std::size_t position) {
-  const std::string_view before = text.substr(0, position);
+  // The byte at fault counts, too: a line end there belongs to its line.
+  const std::string_view before = text.substr(0, position - std::min<std::size_t>(position, 1));
   const std::size_t lineEnd = before.rfind('\n');
-  const std::size_t column = lineEnd == std::string_view::npos ? position : position - lineEnd - 1;
+  std::size_t column = lineEnd == std::string_view::npos ? position : position - lineEnd - 1;
+  constexpr std::string_view kMark = "\xEF\xBB\xBF";
+  if (lineEnd == std::string_view::npos && text.starts_with(kMark)) column -= kMark.size();
   if (text.find('\n') == std::string_view::npos) return format("column %zu", column);
   return format("line %td, column %zu", 1 + std::ranges::count(before, '\n'), column);
 }

@@ -39,9 +39,7 @@ LogPreview previewLog(
     const std::string_view message = *event.value.string();
     if (onLine) onLine(event.subject, message);
     // A left-out histogram is no error for the daemon, but makes the preview incomplete.
-    constexpr std::string_view kLeftOut = kHistogramLeftOut;
-    const bool isFault =
-        event.subject == "error" || message.starts_with(kLeftOut.substr(0, kLeftOut.find('%')));
+    const bool isFault = event.subject == "error" || message.starts_with(kHistogramLeftOut);
     if (isFault) preview.errors.emplace_back(message);
   });
   preview.osVersion = overlay.platform().submission->ZTXOSVersion();
