@@ -60,7 +60,8 @@ void BHReport::computeAndAddDistribution(BHHistoryDistributionEnumerator& values
     platform_.log->log(LogLevel::Debug, "Treating key %@ as a histogram", forKey);
     histogram = Histogram::create(intervals);
     if (!histogram) {
-      platform_.log->log(LogLevel::Default, kHistogramLeftOut, forKey);
+      platform_.log->log(LogLevel::Default, "%s%@. Will not calculate histogram values",
+                         kHistogramLeftOut, forKey);
     }
   }
 

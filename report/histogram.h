@@ -37,9 +37,9 @@ plist::Dictionary histogramDictForIntervals(const plist::Array& intervals,
 plist::Dictionary histogramDictForIntervals(const plist::Array& intervals,
                                             std::span<const std::uint32_t> withHistCounts);
 
-/// Logged for a key whose histogram cannot be computed; the log then has only its summary.
-inline constexpr char kHistogramLeftOut[] =
-    "Couldn't allocate histCounts for key %@. Will not calculate histogram values";
+/// How the line begins that is logged for a key whose histogram cannot be computed; the log then
+/// has only its summary.
+inline constexpr std::string_view kHistogramLeftOut = "Couldn't allocate histCounts for key ";
 
 /// The counters of one computation. Boundaries are converted once, so that counting a value is a
 /// comparison or two.
