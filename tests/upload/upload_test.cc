@@ -365,13 +365,14 @@ TEST(Upload, SaysWhatItCannotReadAndSendsTheRest) {
   ASSERT_EQ(mkfifo(noLog.c_str(), 0600), 0);
   EXPECT_EQ(device.runAgainst(ScriptedServer([](const std::string&) { return kOk; })),
             Outcome::Failed);
-  EXPECT_EQ(device.log.lines,
-            (Lines{"cannot list " + pending + ": Not a directory",
-                   "cannot read " + noLog + ": not a regular file",
-                   "log " + nameOf(2) + " was sent without metadata: " + device.root.path(metadata) +
-                       ": not a property list: it begins neither with "
-                       "\"bplist00\" nor with \"<\"",
-                   "logs sent: 1, refused by the server: 0"}));
+  EXPECT_EQ(
+      device.log.lines,
+      (Lines{"cannot list " + pending + ": Not a directory",
+             "cannot read " + noLog + ": not a regular file",
+             "log " + nameOf(2) + " was sent without metadata: " + device.root.path(metadata) +
+                 ": not a property list: it begins neither with "
+                 "\"bplist00\" nor with \"<\"",
+             "logs sent: 1, refused by the server: 0"}));
 }
 
 TEST(Upload, EndsWithOneLineWhenALogCannotBeRemoved) {
