@@ -47,9 +47,8 @@ std::string leftOutText(const CompareAnswer& answer) {
   const auto add = [&](std::size_t count, const std::string& why) {
     if (count != 0) text += "  " + counted(count, "statistic") + " " + why + "\n";
   };
-  add(answer.leftOut, "that not both versions have in logs of at least " +
-                          std::to_string(answer.devicesAtLeast) +
-                          " devices, or close to a set that was shown");
+  add(answer.leftOut, "without logs of at least " + std::to_string(answer.devicesAtLeast) +
+                          " devices in both versions, or too close to a set that was shown");
   add(answer.unfit, "whose mean or deviation a double cannot hold in one version");
   return text.empty() ? text : "Left out:\n" + text;
 }

@@ -76,15 +76,19 @@ void writeWear(page::HtmlWriter& html, const std::vector<ShowAnswer>& answers) {
       answers, [](const ShowAnswer& answer) { return answer.sides.front().isShown; });
   if (shown == answers.end() || !shown->sides.front().whole.scalar) return;
   static_assert(kPercents[2] == 50 && kPercents[4] == 95);
-  const auto& percentiles = shown->sides.front().whole.scalar->percentiles;
+  const ShownSet& whole = shown->sides.front().whole;
+  const auto& percentiles = whole.scalar->percentiles;
   const std::string_view unit = catalogue::unitOf(shown->request.key);
   html.begin("p");
   html.text("Flash: ");
   html.name(nameOf(shown->request.key));
   html.text(" is at most " + page::figureText(static_cast<double>(percentiles[2]), unit) +
-            " in half of the daily logs, and above " +
-            page::figureText(static_cast<double>(percentiles[4]), unit) +
-            " in no more than one of twenty.");
+            " in half of the daily logs");
+  if (!isOfOneDevice(whole, 4)) {
+    html.text(", and above " + page::figureText(static_cast<double>(percentiles[4]), unit) +
+              " in no more than one of twenty");
+  }
+  html.text(".");
   html.end();
 }
 

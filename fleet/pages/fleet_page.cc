@@ -107,7 +107,8 @@ std::string textOf(const FleetPage& page) {
       "cannot be counted; \"at least\" gives the number that reported on the busiest day.");
   html.element("p",
                "A percentage over a column of figures is the share of logs, or of values, that are "
-               "not above the figure. Of series only the range in which it lies is known.");
+               "not above the figure. Of series only the range in which it lies is known. Of other "
+               "statistics, a percentile that is the lowest or the highest value is not shown.");
   html.element("p", "Groups of fewer than " + countText(summary.devicesAtLeast) +
                         " devices are not shown by themselves. The page leaves out all logs of "
                         "such versions; other groups are joined as \"" +

@@ -23,6 +23,9 @@ std::string nameOf(std::string_view key);
 std::string changeText(const Comparison& one);
 /// "2 logs that have no mean, because ...".
 std::string withoutMeanText(std::size_t logs, std::size_t devicesAtLeast);
+/// Whether a percentile of a scalar, one of `kPercents`, is the lowest or the highest value, and so
+/// that of a single device.
+bool isOfOneDevice(const ShownSet& set, std::size_t index);
 /// "1,234".
 std::string countText(std::size_t count);
 /// "1 statistic", "1,234 statistics".

@@ -57,10 +57,9 @@ std::string intervalText(const Interval& interval, const Text& text) {
 
 std::string percentileText(const ShownSet& set, std::size_t index, std::string_view unit) {
   if (set.scalar) {
-    // The lowest and the highest value, which are those of single devices, stay out.
-    const std::size_t rank = (kPercents[index] * set.logs + 99) / 100;
-    if (rank <= 1 || rank >= set.logs) return "not shown";
-    return cellText(static_cast<double>(set.scalar->percentiles[index]), unit);
+    return isOfOneDevice(set, index)
+               ? "not shown"
+               : cellText(static_cast<double>(set.scalar->percentiles[index]), unit);
   }
   if (index >= set.histogram.percentiles.size()) return "";
   const Interval& interval = set.histogram.percentiles[index];
@@ -179,6 +178,11 @@ std::string countText(std::size_t count) {
 
 std::string counted(std::size_t count, const std::string& what) {
   return countText(count) + " " + what + (count == 1 ? "" : "s");
+}
+
+bool isOfOneDevice(const ShownSet& set, std::size_t index) {
+  const std::size_t rank = (kPercents[index] * set.logs + 99) / 100;
+  return rank <= 1 || rank >= set.logs;
 }
 
 void writeFleet(page::HtmlWriter& html, const SummaryAnswer& summary) {

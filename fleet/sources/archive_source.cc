@@ -80,12 +80,12 @@ class Archive {
     int code = ARCHIVE_OK;
     while ((code = archive_read_data_block(archive_.get(), &block, &size, &offset)) == ARCHIVE_OK) {
       const auto at = static_cast<std::uint64_t>(offset);
+      read_ += static_cast<std::int64_t>(at + size - content.size());
       if (at + size > limit) return false;
       // Sparse members have holes, which take no bytes of the archive.
       content.resize(static_cast<std::size_t>(at));
       content.append(static_cast<const char*>(block), size);
     }
-    read_ += std::ssize(content);
     if (code != ARCHIVE_EOF) note();
     return code == ARCHIVE_EOF;
   }

@@ -109,7 +109,9 @@ void Reading::logs(std::int32_t firstDay, std::int32_t lastDay, const Visitor<Lo
 
 std::vector<Key> Reading::keys() {
   std::vector<Key> keys;
-  Statement statement(connection_, "SELECT kind, name FROM key ORDER BY kind, name");
+  Statement statement(connection_,
+                      "SELECT kind, name FROM key WHERE kind BETWEEN 0 AND 2 "
+                      "ORDER BY kind, name");
   while (statement.step())
     keys.push_back({std::string(statement.text(1)), static_cast<KeyKind>(statement.integer(0))});
   return keys;

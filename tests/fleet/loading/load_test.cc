@@ -209,10 +209,11 @@ TEST_F(LoadTest, TakesArchives) {
   }
   shell(format("head -c %zu early.tar > e.tar", 512 + content + 512 + 512 + 512));
   EXPECT_EQ(run({at("e.tar")}).out, "1 loaded, 0 known, 0 refused\n") << "half of the end mark";
-  // Files of one gigabyte, and of 40 megabytes each, in archives of a few kilobytes.
+  // Files of one gigabyte, and of 70 megabytes each, in archives of a few kilobytes.
   shell("truncate -s 1G big.log && tar -cSf bomb.tar big.log");
   shell(
-      "for n in 1 2 3; do truncate -s 40M h$n.log; echo >> h$n.log; done; tar -cSf holes.tar "
+      "for n in 1 2 3; do truncate -s 60M h$n.log; echo >> h$n.log; truncate -s 70M h$n.log; echo "
+      ">> h$n.log; done; tar -cSf holes.tar "
       "h?.log");
   for (const std::string name : {"bomb.tar", "holes.tar"}) {
     const std::string error = run({at(name)}).error;
