@@ -202,6 +202,7 @@ TEST_F(QuestionCommands, PagesTellNeighbouringBucketsApart) {
     LogRecord& record = all.emplace_back(makeRecord(device, 20779));
     record.osVersion = kOld;
     record.distributions = {{kKey, {1000.3, 1000.5, 1000.4, 0.02, 2}}};
+    record.scalars = {{"com.example.number", static_cast<std::int64_t>(device)}};
     record.cells = {{kKey, 1000.2, 1000.4, "(1000.2, 1000.4]", 1},
                     {kKey, 1000.4, 1000.6, "(1000.4, 1000.6]", 1}};
   }
@@ -211,6 +212,8 @@ TEST_F(QuestionCommands, PagesTellNeighbouringBucketsApart) {
     EXPECT_THAT(page, HasSubstr(std::string("aria-label=") + bar));
   EXPECT_THAT(page, HasSubstr(", many values per log (milliseconds)</p>"));
   EXPECT_THAT(page, HasSubstr("data-title=\"Mean\">1 s</td>"));
+  EXPECT_THAT(page, HasSubstr("data-title=\"5 %\">not shown</td>"));
+  EXPECT_THAT(page, HasSubstr("data-title=\"95 %\">18</td>"));
   EXPECT_THAT(page, HasSubstr("data-title=\"Median\">1000.2 to 1000.4 milliseconds</td>"));
   EXPECT_THAT(run(file, {"show", kKey}).out, HasSubstr(": distribution (milliseconds)\n"));
 }

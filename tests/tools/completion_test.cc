@@ -74,6 +74,7 @@ TEST_F(CompletionTest, HasEveryCommandAndOption) {
   expectIn(device.run("completion zsh").out,
            {"'(--root)--root=[Folder that holds", "--day=[",
             "'(--bool --string --int --float --date --plist)--bool[true, yes"});
+  expectIn(device.run("completion catalogue").out, {"\ncom.norvane.usage.processes\n"});
   EXPECT_EQ(device.run("--help").out.find("completion"), std::string::npos);
   if (shells == 0) GTEST_SKIP() << "neither fish nor zsh: their syntax is not checked";
 }
