@@ -107,15 +107,16 @@ void Tidy::trimStore(const Bounds& bounds, TidiedKind& tidied, std::vector<std::
   auto trim = store_.beginTrim();
   if (!trim) return failures.push_back(trim.error().message);
   if (!*trim) return;
+  const std::int32_t yesterday = previousDay(store_.BHDaysSince1970());
+  const bool isReported = lastRunDay().value_or(INT64_MIN) >= yesterday;
   bool isPartlyUnreadable = false;
   // The second look reads the whole store: once is enough.
   const auto goesOnAfter = [&](const Error& error) {
     if (std::exchange(isPartlyUnreadable, true)) return true;
     const bool looksDamaged = (*trim)->damage().has_value();
     // Before the run of yesterday, the store may hold rows to report.
-    const bool mustStay = lastRunDay().value_or(INT64_MIN) < store_.BHDaysSince1970() - 1;
     const Status replaced =
-        mustStay ? Status(error) : store_.replaceDamaged(*std::move(trim), error);
+        isReported ? store_.replaceDamaged(*std::move(trim), error) : Status(error);
     failures.push_back(replaced ? "statistics store: it was damaged and is set aside, with all "
                                   "its days"
                                 : replaced.error().message);
@@ -147,9 +148,7 @@ void Tidy::trimStore(const Bounds& bounds, TidiedKind& tidied, std::vector<std::
   }
   if (!bytes) return static_cast<void>(goesOnAfter(bytes.error()));
   // Until the run of yesterday, which frees that day, the device may well keep its limits.
-  const std::int32_t yesterday = previousDay(store_.BHDaysSince1970());
-  const bool isRunDue =
-      std::ranges::binary_search(*days, yesterday) && lastRunDay().value_or(INT64_MIN) < yesterday;
+  const bool isRunDue = std::ranges::binary_search(*days, yesterday) && !isReported;
   tidied.exceeds = failures.empty() && exceeds() && !isRunDue;
   const Status given = (*trim)->giveBack(reserveOf(*bytes, left, bounds));
   if (!given) goesOnAfter(given.error());
